@@ -43,9 +43,9 @@ std::string Number::description() const {
   return text;
 }
 
-Dictionary::Dictionary(std::initializer_list<Entry> entries) {
+Dictionary::Dictionary(std::initializer_list<std::pair<std::string_view, Value>> entries) {
   entries_.reserve(entries.size());
-  for (const Entry& e : entries) set(e.first, e.second);
+  for (const auto& [key, value] : entries) set(key, value);
 }
 
 const Value* Dictionary::find(std::string_view key) const {
@@ -62,12 +62,12 @@ Value* Dictionary::find(std::string_view key) {
   return nullptr;
 }
 
-void Dictionary::set(std::string key, Value value) {
+void Dictionary::set(std::string_view key, Value value) {
   if (Value* existing = find(key)) {
     *existing = std::move(value);
     return;
   }
-  entries_.emplace_back(std::move(key), std::move(value));
+  entries_.emplace_back(std::string(key), std::move(value));
 }
 
 bool Dictionary::erase(std::string_view key) {

@@ -58,13 +58,14 @@ class Dictionary {
   using const_iterator = std::vector<Entry>::const_iterator;
 
   Dictionary() = default;
-  Dictionary(std::initializer_list<Entry> entries);
+  // Keys may be given as any text (schema names are string views).
+  Dictionary(std::initializer_list<std::pair<std::string_view, Value>> entries);
 
   const Value* find(std::string_view key) const;
   Value* find(std::string_view key);
   bool contains(std::string_view key) const { return find(key) != nullptr; }
   // Replaces the value of an existing key in place, or appends the key at the end.
-  void set(std::string key, Value value);
+  void set(std::string_view key, Value value);
   bool erase(std::string_view key);
 
   std::size_t size() const { return entries_.size(); }

@@ -1,0 +1,351 @@
+#include "platform/device_library.h"
+
+#include <gtest/gtest.h>
+#include <poll.h>
+#include <stdlib.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <chrono>
+#include <filesystem>
+#include <fstream>
+#include <sstream>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "platform/linux/device_locks.h"
+#include "platform/linux/linux_device_library.h"
+#include "platform/log.h"
+#include "platform/run_loop.h"
+#include "platform/virtual/virtual_device_library.h"
+#include "platform/virtual/virtual_players.h"
+
+namespace zt::platform {
+namespace {
+
+namespace fs = std::filesystem;
+using RunResult = RunLoop::RunResult;
+using ReturnAfter = RunLoop::ReturnAfter;
+
+struct Delivered {
+  ZetoRef device;
+  std::int32_t event;
+};
+
+struct Receiver {
+  std::vector<Delivered> events;
+  DeviceLibrary* unregisterOn = nullptr;  // unregisters from inside its first callback
+
+  static void callback(ZetoRef device, std::int32_t event, void* ignored, void* context) {
+    EXPECT_EQ(ignored, nullptr);
+    auto* self = static_cast<Receiver*>(context);
+    self->events.push_back({device, event});
+    if (self->unregisterOn) self->unregisterOn->ZetoUnregisterFromServer();
+  }
+};
+
+// Each case gets its own folder, with the lock folder inside it.
+class DeviceLibraryTest : public ::testing::Test {
+ protected:
+  void SetUp() override {
+    char pattern[] = "/tmp/zt-device-XXXXXX";
+    ASSERT_NE(mkdtemp(pattern), nullptr);
+    dir_ = pattern;
+    fs::create_directory(dir_ / "runtime");
+    fs::create_directory(dir_ / "volume");
+    setenv("XDG_RUNTIME_DIR", (dir_ / "runtime").c_str(), 1);
+    unsetenv("ZETOSYNCTOOL_LOG");
+    Log::configureFromEnvironment();
+  }
+  void TearDown() override {
+    unsetenv("XDG_RUNTIME_DIR");
+    unsetenv("ZETO_VIRTUAL_DEVICES");
+    unsetenv("ZETOSYNCTOOL_LOG");
+    Log::configureFromEnvironment();
+    fs::remove_all(dir_);
+  }
+
+  std::string writeDeviceFile(const std::string& json) {
+    std::string path = dir_ / "devices.json";
+    std::ofstream(path) << json;
+    return path;
+  }
+  std::string volume() const { return dir_ / "volume"; }
+
+  // The players most cases use: one mounted, one mounting late, one never mounting.
+  std::string threePlayers(double mountAfter = 0.3) {
+    std::ostringstream json;
+    json << R"([{"id": "000A27001A2B3C4D", "volume": ")" << volume()
+         << R"(", "mounted": true, "checkpoint": "/x/self.xml"},)"
+         << R"({"id": "1a2b", "volume": ")" << volume() << R"(", "mount_after": )" << mountAfter
+         << "},"
+         << R"({"id": "F", "volume": ")" << volume() << R"(", "mounted": false}])";
+    return writeDeviceFile(json.str());
+  }
+
+  fs::path dir_;
+};
+
+TEST_F(DeviceLibraryTest, VirtualListsPlayersWithIdsAndMountPoints) {
+  VirtualDeviceLibrary library(threePlayers());
+  std::vector<ZetoRef> devices;
+  ASSERT_EQ(library.ZetoCopyConnected(devices), kZetoSuccess);
+  ASSERT_EQ(devices.size(), 3u);
+  EXPECT_EQ(library.ZetoGetUniqueID(devices[0]), 0xA27001A2B3C4DULL);
+  EXPECT_EQ(library.ZetoGetUniqueID(devices[1]), 0x1A2BULL);
+  EXPECT_EQ(library.ZetoGetUniqueID(devices[2]), 0xFULL);
+  EXPECT_FALSE(devices[0] == devices[1]);
+
+  std::string path = "unchanged";
+  EXPECT_EQ(library.ZetoCopyMountpoint(devices[0], path), kZetoSuccess);
+  EXPECT_EQ(path, volume());
+  EXPECT_EQ(library.mountedFromDevice(devices[0]), "/dev/zetovirt0");
+  EXPECT_EQ(library.checkpoint(devices[0]), "/x/self.xml");
+
+  for (ZetoRef unmounted : {devices[1], devices[2]}) {
+    path = "unchanged";
+    EXPECT_EQ(library.ZetoCopyMountpoint(unmounted, path), kZetoErrorNotMounted);
+    EXPECT_EQ(path, "unchanged");
+    EXPECT_EQ(library.mountedFromDevice(unmounted), std::nullopt);
+  }
+  EXPECT_EQ(library.checkpoint(devices[1]), std::nullopt);
+
+  // A second listing gives references equal to the first.
+  std::vector<ZetoRef> again;
+  ASSERT_EQ(library.ZetoCopyConnected(again), kZetoSuccess);
+  EXPECT_EQ(again, devices);
+}
+
+TEST_F(DeviceLibraryTest, VirtualLateMountArrivesAsAttachedThenMountedInTheRegisteredMode) {
+  RunLoop loop;  // outlives the registration
+  VirtualDeviceLibrary library(threePlayers(0.3));
+  std::vector<ZetoRef> devices;
+  ASSERT_EQ(library.ZetoCopyConnected(devices), kZetoSuccess);
+  Receiver receiver;
+  auto start = RunLoop::Clock::now();
+  ASSERT_EQ(library.ZetoRegisterWithServer(loop, "ZetoMode", &Receiver::callback, &receiver),
+            kZetoSuccess);
+
+  // Running another mode past the mount time delivers nothing.
+  int quiet[2];
+  ASSERT_EQ(pipe(quiet), 0);
+  auto other = loop.addDescriptor(quiet[0], POLLIN, {"Other"}, [](int, short) {});
+  EXPECT_EQ(loop.runInMode("Other", 0.5, ReturnAfter::SourceHandled), RunResult::TimedOut);
+  loop.removeSource(other);
+  close(quiet[0]);
+  close(quiet[1]);
+  EXPECT_TRUE(receiver.events.empty());
+
+  EXPECT_EQ(loop.runInMode("ZetoMode", 5.0, ReturnAfter::SourceHandled), RunResult::SourceHandled);
+  EXPECT_GE(std::chrono::duration<double>(RunLoop::Clock::now() - start).count(), 0.3);
+  ASSERT_EQ(receiver.events.size(), 2u);
+  EXPECT_EQ(receiver.events[0].device, devices[1]);
+  EXPECT_EQ(receiver.events[0].event, static_cast<std::int32_t>(ZetoEvent::Attached));
+  EXPECT_EQ(receiver.events[1].device, devices[1]);
+  EXPECT_EQ(receiver.events[1].event, static_cast<std::int32_t>(ZetoEvent::Mounted));
+
+  std::string path;
+  EXPECT_EQ(library.ZetoCopyMountpoint(devices[1], path), kZetoSuccess);
+  EXPECT_EQ(path, volume());
+  EXPECT_EQ(library.mountedFromDevice(devices[1]), "/dev/zetovirt1");
+  EXPECT_EQ(library.ZetoUnregisterFromServer(), kZetoSuccess);
+  EXPECT_EQ(loop.runInMode("ZetoMode", 0.1, ReturnAfter::SourceHandled), RunResult::NoSources);
+}
+
+TEST_F(DeviceLibraryTest, VirtualPlayerThatNeverMountsLetsTheWaitTimeOut) {
+  RunLoop loop;
+  VirtualDeviceLibrary library(
+      writeDeviceFile(R"([{"id": "F", "volume": ")" + volume() + R"(", "mounted": false}])"));
+  std::vector<ZetoRef> devices;
+  ASSERT_EQ(library.ZetoCopyConnected(devices), kZetoSuccess);
+  Receiver receiver;
+  ASSERT_EQ(library.ZetoRegisterWithServer(loop, "ZetoMode", &Receiver::callback, &receiver),
+            kZetoSuccess);
+  auto start = RunLoop::Clock::now();
+  // The registration itself is a source of the mode: the wait lasts its full time.
+  EXPECT_EQ(loop.runInMode("ZetoMode", 0.3, ReturnAfter::SourceHandled), RunResult::TimedOut);
+  EXPECT_GE(std::chrono::duration<double>(RunLoop::Clock::now() - start).count(), 0.3);
+  EXPECT_TRUE(receiver.events.empty());
+  std::string path;
+  EXPECT_EQ(library.ZetoCopyMountpoint(devices[0], path), kZetoErrorNotMounted);
+}
+
+TEST_F(DeviceLibraryTest, VirtualUnregisterStopsDelivery) {
+  RunLoop loop;
+  VirtualDeviceLibrary library(threePlayers(0.1));
+  std::vector<ZetoRef> devices;
+  ASSERT_EQ(library.ZetoCopyConnected(devices), kZetoSuccess);
+  Receiver receiver;
+  ASSERT_EQ(library.ZetoRegisterWithServer(loop, "ZetoMode", &Receiver::callback, &receiver),
+            kZetoSuccess);
+  library.ZetoUnregisterFromServer();
+  EXPECT_EQ(loop.runInMode("ZetoMode", 0.3, ReturnAfter::TimeElapsed), RunResult::NoSources);
+  EXPECT_TRUE(receiver.events.empty());
+  std::string path;
+  EXPECT_EQ(library.ZetoCopyMountpoint(devices[1], path), kZetoErrorNotMounted);
+
+  // Unregistering from inside the callback stops the rest of that delivery.
+  receiver.unregisterOn = &library;
+  ASSERT_EQ(library.ZetoRegisterWithServer(loop, "ZetoMode", &Receiver::callback, &receiver),
+            kZetoSuccess);
+  EXPECT_EQ(loop.runInMode("ZetoMode", 5.0, ReturnAfter::SourceHandled), RunResult::SourceHandled);
+  ASSERT_EQ(receiver.events.size(), 1u);
+  EXPECT_EQ(receiver.events[0].event, static_cast<std::int32_t>(ZetoEvent::Attached));
+  EXPECT_EQ(loop.runInMode("ZetoMode", 0.1, ReturnAfter::SourceHandled), RunResult::NoSources);
+}
+
+TEST_F(DeviceLibraryTest, VirtualMalformedFilesAreErrorsWithAReasonInTheLog) {
+  const std::vector<std::pair<std::string, std::string>> cases = {
+      {"[{\"id\": ", "not JSON"},
+      {R"({"id": "F", "volume": "/v"})", "not an array"},
+      {R"(["F"])", "entry 0: not an object"},
+      {R"([{"volume": "/v"}])", "\"id\" is missing"},
+      {R"([{"id": 15, "volume": "/v"}])", "\"id\" is missing or not a text"},
+      {R"([{"id": "12345678901234567", "volume": "/v"}])", "hexadecimal"},
+      {R"([{"id": "", "volume": "/v"}])", "hexadecimal"},
+      {R"([{"id": "0x1F", "volume": "/v"}])", "hexadecimal"},
+      {R"([{"id": "F", "volume": "/v"}, {"id": "E"}])", "entry 1: \"volume\""},
+      {R"([{"id": "F", "volume": "/v", "mounted": "yes"}])", "\"mounted\""},
+      {R"([{"id": "F", "volume": "/v", "mount_after": -1}])", "\"mount_after\""},
+      {R"([{"id": "F", "volume": "/v", "checkpoint": 3}])", "\"checkpoint\""},
+  };
+  for (std::size_t i = 0; i < cases.size(); ++i) {
+    const auto& [json, reason] = cases[i];
+    SCOPED_TRACE(json);
+    std::string log = dir_ / ("log" + std::to_string(i) + ".txt");
+    setenv("ZETOSYNCTOOL_LOG", log.c_str(), 1);
+    Log::configureFromEnvironment();
+    RunLoop loop;
+    VirtualDeviceLibrary library(writeDeviceFile(json));
+    std::vector<ZetoRef> devices;
+    EXPECT_NE(library.ZetoCopyConnected(devices), kZetoSuccess);
+    EXPECT_TRUE(devices.empty());
+    EXPECT_NE(library.ZetoRegisterWithServer(loop, "ZetoMode", &Receiver::callback, nullptr),
+              kZetoSuccess);
+    std::ifstream in(log);
+    std::string line;
+    ASSERT_TRUE(std::getline(in, line));
+    EXPECT_NE(line.find("devices.json"), std::string::npos) << line;
+    EXPECT_NE(line.find(reason), std::string::npos) << line;
+  }
+  VirtualDeviceLibrary missing((dir_ / "absent.json").string());
+  std::vector<ZetoRef> devices;
+  EXPECT_EQ(missing.ZetoCopyConnected(devices), kZetoErrorBadDeviceFile);
+}
+
+TEST(VirtualPlayers, MountedFollowsMountAfterUnlessGiven) {
+  std::string whyNot;
+  auto players = parseVirtualPlayers(R"([
+      {"id": "a", "volume": "/v"},
+      {"id": "b", "volume": "/v", "mount_after": 2},
+      {"id": "c", "volume": "/v", "mount_after": 0.5, "mounted": true},
+      {"id": "ffffffffffffffff", "volume": "/v", "mounted": false, "extra": 1}])",
+                                     whyNot);
+  ASSERT_TRUE(players) << whyNot;
+  ASSERT_EQ(players->size(), 4u);
+  EXPECT_TRUE((*players)[0].mounted);
+  EXPECT_FALSE((*players)[0].mountAfter);
+  EXPECT_FALSE((*players)[1].mounted);
+  EXPECT_EQ((*players)[1].mountAfter, 2.0);
+  EXPECT_TRUE((*players)[2].mounted);
+  EXPECT_EQ((*players)[3].uniqueId, UINT64_MAX);
+  EXPECT_FALSE((*players)[3].mounted);
+  EXPECT_TRUE(parseVirtualPlayers("[]", whyNot).has_value());
+}
+
+TEST(VirtualPlayers, DeviceNodesNameTheirIndex) {
+  EXPECT_EQ(virtualDeviceNode(0), "/dev/zetovirt0");
+  EXPECT_EQ(virtualPlayerIndexOfNode(virtualDeviceNode(12)), 12u);
+  EXPECT_EQ(virtualPlayerIndexOfNode("/dev/zetovirt"), std::nullopt);
+  EXPECT_EQ(virtualPlayerIndexOfNode("/dev/zetovirt1s1"), std::nullopt);
+  EXPECT_EQ(virtualPlayerIndexOfNode("/dev/sdb1"), std::nullopt);
+}
+
+// Runs `body` in a child process and returns its exit status.
+template <typename Body>
+int inChild(Body body) {
+  pid_t pid = fork();
+  if (pid == 0) _exit(body());
+  int status = 0;
+  waitpid(pid, &status, 0);
+  return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+}
+
+TEST_F(DeviceLibraryTest, LockIsExclusiveAcrossProcessesUntilReleased) {
+  std::string file = threePlayers();
+  VirtualDeviceLibrary library(file);
+  std::vector<ZetoRef> devices;
+  ASSERT_EQ(library.ZetoCopyConnected(devices), kZetoSuccess);
+  auto childTakesLock = [&] {
+    return inChild([&] {
+      VirtualDeviceLibrary other(file);
+      std::vector<ZetoRef> theirs;
+      if (other.ZetoCopyConnected(theirs) != kZetoSuccess) return 2;
+      std::int32_t result = other.ZetoAquireLock(theirs[0]);
+      if (result == kZetoErrorLockBusy) return 1;
+      return result == kZetoSuccess ? 0 : 3;
+    });
+  };
+
+  ASSERT_EQ(library.ZetoAquireLock(devices[0]), kZetoSuccess);
+  EXPECT_EQ(childTakesLock(), 1);
+  // Not re-entrant, and other players' locks are separate.
+  EXPECT_EQ(library.ZetoAquireLock(devices[0]), kZetoErrorLockBusy);
+  EXPECT_EQ(library.ZetoAquireLock(devices[1]), kZetoSuccess);
+  EXPECT_TRUE(fs::exists(dir_ / "runtime/zeto/A27001A2B3C4D.lock"));
+  EXPECT_EQ(fs::status(dir_ / "runtime/zeto").permissions() & fs::perms::all, fs::perms::owner_all);
+
+  EXPECT_EQ(library.ZetoReleaseLock(devices[0]), kZetoSuccess);
+  EXPECT_EQ(childTakesLock(), 0);
+  EXPECT_EQ(library.ZetoReleaseLock(devices[0]), kZetoErrorNotLocked);
+  EXPECT_EQ(library.ZetoReleaseLock(devices[2]), kZetoErrorNotLocked);
+}
+
+TEST_F(DeviceLibraryTest, LockIsSharedWithEveryBackendByIdentifier) {
+  VirtualDeviceLibrary library(threePlayers());
+  std::vector<ZetoRef> devices;
+  ASSERT_EQ(library.ZetoCopyConnected(devices), kZetoSuccess);
+  ASSERT_EQ(library.ZetoAquireLock(devices[1]), kZetoSuccess);
+  // The linux backend locks by the same identifier text.
+  EXPECT_EQ(inChild([] { return DeviceLocks().acquire(0x1A2B) == kZetoErrorLockBusy ? 0 : 1; }), 0);
+  EXPECT_EQ(inChild([] { return DeviceLocks().acquire(0x1A2C) == kZetoSuccess ? 0 : 1; }), 0);
+}
+
+TEST_F(DeviceLibraryTest, LockDiesWithItsHolder) {
+  VirtualDeviceLibrary library(threePlayers());
+  std::vector<ZetoRef> devices;
+  ASSERT_EQ(library.ZetoCopyConnected(devices), kZetoSuccess);
+  // A holder that ends without releasing leaves the player free.
+  EXPECT_EQ(inChild([] {
+              auto* leaked = new DeviceLocks();  // never destroyed: the process just ends
+              return leaked->acquire(0xA27001A2B3C4DULL) == kZetoSuccess ? 0 : 1;
+            }),
+            0);
+  EXPECT_EQ(library.ZetoAquireLock(devices[0]), kZetoSuccess);
+}
+
+TEST_F(DeviceLibraryTest, LockFallsBackToRunLockWithoutRuntimeFolder) {
+  unsetenv("XDG_RUNTIME_DIR");
+  EXPECT_EQ(DeviceLocks::lockPathFor(0x1A2B), "/run/lock/zeto-1A2B.lock");
+  setenv("XDG_RUNTIME_DIR", (dir_ / "runtime").c_str(), 1);
+  EXPECT_EQ(DeviceLocks::lockPathFor(0xABC), (dir_ / "runtime/zeto/ABC.lock").string());
+}
+
+TEST_F(DeviceLibraryTest, FactoryChoosesVirtualWhenTheDeviceFileIsNamed) {
+  setenv("ZETO_VIRTUAL_DEVICES", threePlayers().c_str(), 1);
+  auto library = makeDeviceLibrary();
+  EXPECT_NE(dynamic_cast<VirtualDeviceLibrary*>(library.get()), nullptr);
+  std::vector<ZetoRef> devices;
+  EXPECT_EQ(library->ZetoCopyConnected(devices), kZetoSuccess);
+  EXPECT_EQ(devices.size(), 3u);
+
+  unsetenv("ZETO_VIRTUAL_DEVICES");
+  EXPECT_NE(dynamic_cast<LinuxDeviceLibrary*>(makeDeviceLibrary().get()), nullptr);
+  setenv("ZETO_VIRTUAL_DEVICES", "", 1);
+  EXPECT_NE(dynamic_cast<LinuxDeviceLibrary*>(makeDeviceLibrary().get()), nullptr);
+}
+
+}  // namespace
+}  // namespace zt::platform
