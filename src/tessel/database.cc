@@ -1,0 +1,135 @@
+#include "tessel/database.h"
+
+#include <chrono>
+#include <string>
+#include <system_error>
+#include <vector>
+
+#include "tessel/exception.h"
+
+namespace tessel::detail {
+
+namespace {
+
+// Each step brings the schema from version i to i + 1. Steps are never edited once shipped:
+// a change of the schema is a new step.
+const std::vector<const char*>& migrations() {
+  static const std::vector<const char*> steps = {
+      R"sql(
+CREATE TABLE store_state(
+  id INTEGER PRIMARY KEY CHECK (id = 1),
+  generation INTEGER NOT NULL);
+INSERT INTO store_state(id, generation) VALUES (1, 0);
+
+CREATE TABLE records(
+  key INTEGER PRIMARY KEY,
+  id TEXT NOT NULL UNIQUE,
+  entity TEXT NOT NULL,
+  generation INTEGER NOT NULL UNIQUE,
+  deleted INTEGER NOT NULL DEFAULT 0,
+  data BLOB);
+CREATE INDEX records_by_entity ON records(entity, deleted);
+
+CREATE TABLE clients(
+  id TEXT PRIMARY KEY,
+  display_name TEXT NOT NULL,
+  registered_at INTEGER NOT NULL) WITHOUT ROWID;
+
+CREATE TABLE client_entities(
+  client_id TEXT NOT NULL REFERENCES clients(id) ON DELETE CASCADE,
+  entity TEXT NOT NULL,
+  PRIMARY KEY (client_id, entity)) WITHOUT ROWID;
+
+CREATE TABLE client_settings(
+  client_id TEXT NOT NULL REFERENCES clients(id) ON DELETE CASCADE,
+  key TEXT NOT NULL,
+  value BLOB NOT NULL,
+  PRIMARY KEY (client_id, key)) WITHOUT ROWID;
+
+CREATE TABLE client_filters(
+  client_id TEXT NOT NULL REFERENCES clients(id) ON DELETE CASCADE,
+  position INTEGER NOT NULL,
+  class_name TEXT NOT NULL,
+  payload BLOB NOT NULL,
+  PRIMARY KEY (client_id, position)) WITHOUT ROWID;
+
+CREATE TABLE mirror(
+  client_id TEXT NOT NULL REFERENCES clients(id) ON DELETE CASCADE,
+  record_id TEXT NOT NULL,
+  entity TEXT NOT NULL,
+  generation INTEGER NOT NULL,
+  PRIMARY KEY (client_id, record_id)) WITHOUT ROWID;
+CREATE INDEX mirror_by_entity ON mirror(client_id, entity);
+
+CREATE TABLE sessions(
+  client_id TEXT PRIMARY KEY REFERENCES clients(id) ON DELETE CASCADE,
+  token TEXT NOT NULL,
+  owner_pid INTEGER NOT NULL,
+  owner_start INTEGER NOT NULL,
+  began_at INTEGER NOT NULL,
+  ended_at INTEGER,
+  outcome INTEGER NOT NULL,
+  cancel_requested INTEGER NOT NULL DEFAULT 0) WITHOUT ROWID;
+)sql",
+  };
+  return steps;
+}
+
+}  // namespace
+
+std::int64_t unixNow() {
+  return std::chrono::duration_cast<std::chrono::seconds>(
+             std::chrono::system_clock::now().time_since_epoch())
+      .count();
+}
+
+Database::Database(std::filesystem::path path, StoreOpening opening) : path_(std::move(path)) {
+  std::error_code error;
+  if (opening == StoreOpening::MustExist) {
+    if (!std::filesystem::exists(path_, error)) {
+      throw Exception(TesselStoreException, "no store at " + path_.string());
+    }
+  } else if (path_.has_parent_path()) {
+    std::filesystem::create_directories(path_.parent_path(), error);
+    if (error) {
+      throw Exception(TesselStoreException,
+                      "cannot create the folder of " + path_.string() + ": " + error.message());
+    }
+  }
+  writer_ = std::make_unique<Connection>(
+      path_, opening == StoreOpening::MustExist ? FileCreation::Forbidden : FileCreation::Allowed);
+  migrate();
+}
+
+std::unique_ptr<Connection> Database::openReader() const {
+  return std::make_unique<Connection>(path_, FileCreation::Forbidden);
+}
+
+int Database::schemaVersion() {
+  Statement& query = writer_->cached("SELECT version FROM schema_version");
+  StatementReset reset(query);
+  return query.step() ? static_cast<int>(query.integer(0)) : 0;
+}
+
+void Database::migrate() {
+  const auto& steps = migrations();
+  const int latest = static_cast<int>(steps.size());
+  // Most opens find the schema current; check without taking the write lock.
+  writer_->execute("CREATE TABLE IF NOT EXISTS schema_version(version INTEGER NOT NULL)");
+  if (schemaVersion() == latest) return;
+
+  WriteTransaction transaction(*writer_);
+  int version = schemaVersion();
+  if (version > latest) {
+    throw Exception(TesselStoreException, path_.string() +
+                                              " was written by a newer engine "
+                                              "(schema " +
+                                              std::to_string(version) + ")");
+  }
+  for (int step = version; step < latest; ++step) writer_->execute(steps[step]);
+  writer_->execute("DELETE FROM schema_version");
+  writer_->cached("INSERT INTO schema_version(version) VALUES (?)").bind(1, latest).run();
+  transaction.commit();
+}
+
+}  // namespace tessel::detail

@@ -1,0 +1,428 @@
+#include "tessel/session.h"
+
+#include <algorithm>
+#include <cstdio>
+#include <random>
+
+#include "tessel/client.h"
+#include "tessel/exception.h"
+#include "tessel/filter_registry.h"
+#include "tessel/process_identity.h"
+#include "tessel/schema.h"
+#include "tessel/session_outcome_codes.h"
+#include "tessel/session_state.h"
+#include "tessel/value_codec.h"
+
+namespace tessel {
+
+namespace {
+
+using detail::Statement;
+using detail::StatementReset;
+
+// Change types of the session's change table. A prune is never offered: it removes from the
+// mirror a record that a replacing session no longer delivers, and counts as accepted.
+enum StoredChange : std::int64_t { kAdd = 1, kModify = 2, kDelete = 3, kPrune = 4 };
+
+std::string randomToken() {
+  std::random_device device;
+  std::uniform_int_distribution<unsigned long long> bits;
+  char text[33];
+  std::snprintf(text, sizeof text, "%016llx%016llx", bits(device), bits(device));
+  return text;
+}
+
+// "?2, ?3, ..." for `count` parameters starting at `first`.
+std::string placeholders(std::size_t count, int first) {
+  std::string text;
+  for (std::size_t i = 0; i < count; ++i) {
+    if (i) text += ", ";
+    text += "?" + std::to_string(first + static_cast<int>(i));
+  }
+  return text;
+}
+
+bool contains(const std::vector<std::string>& names, std::string_view name) {
+  return std::find(names.begin(), names.end(), name) != names.end();
+}
+
+}  // namespace
+
+namespace detail {
+
+SessionState::SessionState(std::shared_ptr<Database> database_, std::string clientIdentifier_,
+                           std::string token_, std::vector<std::string> entityNames_,
+                           std::vector<std::string> entityNamesToReplace_)
+    : database(std::move(database_)),
+      clientIdentifier(std::move(clientIdentifier_)),
+      token(std::move(token_)),
+      entityNames(std::move(entityNames_)),
+      entityNamesToReplace(std::move(entityNamesToReplace_)) {}
+
+bool SessionState::cancelRequested() {
+  auto& query = database->writer().cached(
+      "SELECT token, outcome, cancel_requested FROM sessions WHERE client_id = ?");
+  StatementReset reset(query);
+  query.bind(1, clientIdentifier);
+  if (!query.step()) return true;
+  return query.text(0) != token || outcomeFromStored(query.integer(1)) != SessionOutcome::Running ||
+         query.integer(2) != 0;
+}
+
+void SessionState::ensureRunning() {
+  if (phase == Phase::Running && cancelRequested()) phase = Phase::CancelSeen;
+  switch (phase) {
+    case Phase::Running:
+      return;
+    case Phase::CancelSeen:
+    case Phase::Cancelled:
+      throw Exception(TesselSessionCancelledException,
+                      "the session of client " + clientIdentifier + " was cancelled");
+    case Phase::Finished:
+      throw Exception(TesselSessionEndedException,
+                      "the session of client " + clientIdentifier + " has finished");
+  }
+}
+
+void SessionState::end(SessionOutcome outcome) {
+  database->writer()
+      .cached(
+          "UPDATE sessions SET outcome = ?, ended_at = ?, cancel_requested = "
+          "(cancel_requested OR ?) WHERE client_id = ? AND token = ? AND outcome = ?")
+      .bind(1, storedOutcome(outcome))
+      .bind(2, unixNow())
+      .bind(3, outcome == SessionOutcome::Cancelled ? 1 : 0)
+      .bind(4, clientIdentifier)
+      .bind(5, token)
+      .bind(6, storedOutcome(SessionOutcome::Running))
+      .run();
+}
+
+}  // namespace detail
+
+std::unique_ptr<Session> Session::begin(const Client& client,
+                                        const std::vector<std::string>& entityNames) {
+  std::shared_ptr<detail::Database> database = client.sharedDatabase();
+  detail::Connection& writer = database->writer();
+  const std::string& clientIdentifier = client.identifier();
+  std::string token = randomToken();
+  detail::ProcessIdentity self = detail::ProcessIdentity::current();
+  {
+    detail::WriteTransaction transaction(writer);
+    {
+      auto& known = writer.cached("SELECT 1 FROM clients WHERE id = ?");
+      StatementReset reset(known);
+      known.bind(1, clientIdentifier);
+      if (!known.step()) {
+        throw Exception(TesselUnknownClientException, "no client " + clientIdentifier);
+      }
+    }
+    {
+      auto& running = writer.cached(
+          "SELECT owner_pid, owner_start FROM sessions WHERE client_id = ? AND outcome = ?");
+      StatementReset reset(running);
+      running.bind(1, clientIdentifier).bind(2, detail::storedOutcome(SessionOutcome::Running));
+      if (running.step()) {
+        detail::ProcessIdentity owner{static_cast<long>(running.integer(0)), running.integer(1)};
+        // A session left behind by a process that is gone no longer blocks: it is replaced.
+        if (owner.isAlive()) {
+          throw Exception(TesselSessionRunningException, "client " + clientIdentifier +
+                                                             " has a session running in process " +
+                                                             std::to_string(owner.pid));
+        }
+      }
+    }
+    writer
+        .cached(
+            "INSERT OR REPLACE INTO sessions(client_id, token, owner_pid, owner_start, began_at, "
+            "ended_at, outcome, cancel_requested) VALUES (?, ?, ?, ?, ?, NULL, ?, 0)")
+        .bind(1, clientIdentifier)
+        .bind(2, token)
+        .bind(3, static_cast<std::int64_t>(self.pid))
+        .bind(4, self.startTime)
+        .bind(5, detail::unixNow())
+        .bind(6, detail::storedOutcome(SessionOutcome::Running))
+        .run();
+    transaction.commit();
+  }
+  auto state = std::make_shared<detail::SessionState>(database, clientIdentifier, std::move(token),
+                                                      entityNames, client.entityNamesToReplace());
+  try {
+    state->view = std::make_shared<detail::ReadView>(*database);
+    state->snapshot = std::make_shared<Snapshot>(state->view, entityNames);
+  } catch (...) {
+    state->end(SessionOutcome::Cancelled);
+    throw;
+  }
+  return std::make_unique<Session>(std::move(state));
+}
+
+Session::Session(std::shared_ptr<detail::SessionState> state) : state_(std::move(state)) {}
+
+Session::~Session() {
+  if (state_->phase == detail::SessionState::Phase::Running ||
+      state_->phase == detail::SessionState::Phase::CancelSeen) {
+    try {
+      cancelSyncing();
+    } catch (...) {
+      // Nothing to do: a session nobody ends counts as cancelled once this process is gone.
+    }
+  }
+}
+
+const std::string& Session::clientIdentifier() const {
+  return state_->clientIdentifier;
+}
+
+const std::vector<std::string>& Session::entityNames() const {
+  return state_->entityNames;
+}
+
+void Session::prepareToPullChanges(const std::vector<std::string>& entityNames) {
+  state_->ensureRunning();
+  std::vector<std::string> entities;
+  for (const std::string& name : entityNames) {
+    if (contains(state_->entityNames, name) && !contains(entities, name)) entities.push_back(name);
+  }
+  if (entities.empty()) return;
+  detail::Connection& connection = state_->view->connection();
+  const std::string& client = state_->clientIdentifier;
+
+  // The filters as the session's view holds them.
+  FilterList filters;
+  {
+    std::vector<std::pair<std::string, zt::platform::Data>> stored;
+    Statement query(connection,
+                    "SELECT class_name, payload FROM main.client_filters WHERE client_id = ? "
+                    "ORDER BY position");
+    query.bind(1, client);
+    while (query.step()) {
+      auto payload = query.blob(1);
+      stored.emplace_back(std::string(query.text(0)),
+                          zt::platform::Data(payload.begin(), payload.end()));
+    }
+    query.reset();
+    for (const auto& [className, payload] : stored) {
+      filters.push_back(FilterRegistry::shared().decode(className, payload));
+    }
+  }
+  // What to do per entity, looked up by name for every record: a handful of entities, so a
+  // linear search beats hashing a fresh string per record.
+  struct EntityRule {
+    std::string name;
+    std::vector<const Filtering*> judges;
+    bool replace;
+  };
+  std::vector<EntityRule> rules;
+  for (const std::string& entity : entities) {
+    EntityRule rule{entity, {}, contains(state_->entityNamesToReplace, entity)};
+    for (const auto& filter : filters) {
+      if (contains(filter->supportedEntityNames(), entity)) rule.judges.push_back(filter.get());
+    }
+    rules.push_back(std::move(rule));
+  }
+  auto ruleOf = [&](std::string_view entity) -> const EntityRule& {
+    for (const EntityRule& rule : rules) {
+      if (rule.name == entity) return rule;
+    }
+    return rules.front();  // not reached: the queries select these entities only
+  };
+
+  std::string inList = placeholders(entities.size(), 2);
+  auto bindEntities = [&](Statement& statement) {
+    statement.bind(1, client);
+    for (std::size_t i = 0; i < entities.size(); ++i) {
+      statement.bind(static_cast<int>(i) + 2, entities[i]);
+    }
+  };
+  {
+    // A change already committed in this session stays; the others are worked out anew.
+    Statement clear(connection, "DELETE FROM temp.changes WHERE committed = 0 AND entity IN (" +
+                                    placeholders(entities.size(), 1) + ")");
+    for (std::size_t i = 0; i < entities.size(); ++i) {
+      clear.bind(static_cast<int>(i) + 1, entities[i]);
+    }
+    clear.run();
+  }
+  Statement insert(connection,
+                   "INSERT OR IGNORE INTO temp.changes(record_id, record_key, entity, type, "
+                   "generation, accepted) VALUES (?, ?, ?, ?, ?, ?)");
+  auto add = [&](std::string_view id, std::optional<std::int64_t> key, std::string_view entity,
+                 std::int64_t type, std::int64_t generation) {
+    insert.bind(1, id);
+    if (key) insert.bind(2, *key);
+    insert.bind(3, entity).bind(4, type).bind(5, generation).bind(6, type == kPrune ? 1 : 0);
+    insert.run();
+  };
+
+  // One pass over truth joined with the mirror, in the order truth changed. Records are
+  // decoded only when a filter must judge them. The unary + keeps SQLite walking the
+  // generation index instead of sorting every record (blobs included) by generation.
+  {
+    Statement truth(connection,
+                    "SELECT r.key, r.id, r.entity, r.generation, r.deleted, r.data, m.generation "
+                    "FROM main.records r LEFT JOIN main.mirror m "
+                    "ON m.client_id = ?1 AND m.record_id = r.id "
+                    "WHERE +r.entity IN (" +
+                        inList + ") ORDER BY r.generation");
+    bindEntities(truth);
+    while (truth.step()) {
+      std::int64_t key = truth.integer(0);
+      std::string_view id = truth.text(1);
+      std::string_view entity = truth.text(2);
+      std::int64_t generation = truth.integer(3);
+      bool deleted = truth.integer(4) != 0;
+      std::optional<std::int64_t> held;
+      if (!truth.isNull(6)) held = truth.integer(6);
+      const EntityRule& rule = ruleOf(entity);
+      bool replace = rule.replace;
+      if (deleted) {
+        if (held) add(id, std::nullopt, entity, replace ? kPrune : kDelete, generation);
+        continue;
+      }
+      bool passes = true;
+      if (!rule.judges.empty()) {
+        zt::platform::Dictionary record = detail::decodeRecord(truth.blob(5));
+        std::string identifier(id);
+        for (const Filtering* filter : rule.judges) {
+          if (!filter->shouldApplyRecord(record, identifier)) {
+            passes = false;
+            break;
+          }
+        }
+      }
+      if (replace) {
+        if (passes) {
+          add(id, key, entity, kAdd, generation);
+        } else if (held) {
+          add(id, std::nullopt, entity, kPrune, generation);
+        }
+      } else if (passes) {
+        if (!held) {
+          add(id, key, entity, kAdd, generation);
+        } else if (generation > *held) {
+          add(id, key, entity, kModify, generation);
+        }
+      } else if (held) {
+        add(id, std::nullopt, entity, kDelete, generation);
+      }
+    }
+  }
+  // Records the client holds that truth never had (or lost without a tombstone).
+  {
+    Statement orphans(connection,
+                      "SELECT m.record_id, m.entity, m.generation FROM main.mirror m "
+                      "WHERE m.client_id = ?1 AND m.entity IN (" +
+                          inList +
+                          ") AND NOT EXISTS (SELECT 1 FROM main.records r "
+                          "WHERE r.id = m.record_id) ORDER BY m.record_id");
+    bindEntities(orphans);
+    while (orphans.step()) {
+      std::string_view entity = orphans.text(1);
+      add(orphans.text(0), std::nullopt, entity, ruleOf(entity).replace ? kPrune : kDelete,
+          orphans.integer(2));
+    }
+  }
+}
+
+ChangeEnumerator Session::changeEnumerator(const std::vector<std::string>& entityNames) {
+  state_->ensureRunning();
+  auto statement = std::make_unique<Statement>(
+      state_->view->connection(),
+      "SELECT c.type, c.record_id, c.entity, r.data FROM temp.changes c "
+      "LEFT JOIN main.records r ON r.key = c.record_key AND c.type <> 3 "
+      "WHERE c.committed = 0 AND c.type <> 4 AND c.entity IN (" +
+          placeholders(entityNames.size(), 1) + ") ORDER BY c.seq");
+  for (std::size_t i = 0; i < entityNames.size(); ++i) {
+    statement->bind(static_cast<int>(i) + 1, entityNames[i]);
+  }
+  return ChangeEnumerator(state_, std::move(statement));
+}
+
+void Session::clientAcceptedChanges(std::string_view recordIdentifier) {
+  state_->ensureRunning();
+  state_->view->connection()
+      .cached("UPDATE temp.changes SET accepted = 1 WHERE record_id = ? AND committed = 0")
+      .bind(1, recordIdentifier)
+      .run();
+}
+
+void Session::clientCommittedAcceptedChanges() {
+  state_->ensureRunning();
+  detail::Connection& writer = state_->database->writer();
+  detail::Connection& view = state_->view->connection();
+  {
+    detail::WriteTransaction transaction(writer);
+    // Checked again under the write lock: a cancel that won the race keeps the mirror intact.
+    if (state_->cancelRequested()) {
+      state_->phase = detail::SessionState::Phase::CancelSeen;
+      state_->ensureRunning();
+    }
+    auto& upsert = writer.cached(
+        "INSERT INTO mirror(client_id, record_id, entity, generation) VALUES (?, ?, ?, ?) "
+        "ON CONFLICT(client_id, record_id) DO UPDATE SET entity = excluded.entity, "
+        "generation = excluded.generation");
+    auto& forget = writer.cached("DELETE FROM mirror WHERE client_id = ? AND record_id = ?");
+    auto& accepted = view.cached(
+        "SELECT record_id, entity, type, generation FROM temp.changes "
+        "WHERE accepted = 1 AND committed = 0 ORDER BY seq");
+    StatementReset reset(accepted);
+    while (accepted.step()) {
+      std::int64_t type = accepted.integer(2);
+      if (type == kAdd || type == kModify) {
+        upsert.bind(1, state_->clientIdentifier)
+            .bind(2, accepted.text(0))
+            .bind(3, accepted.text(1))
+            .bind(4, accepted.integer(3))
+            .run();
+      } else {
+        forget.bind(1, state_->clientIdentifier).bind(2, accepted.text(0)).run();
+      }
+    }
+    transaction.commit();
+  }
+  view.cached("UPDATE temp.changes SET committed = 1 WHERE accepted = 1 AND committed = 0").run();
+}
+
+void Session::finishSyncing() {
+  state_->ensureRunning();
+  // One statement checks and ends, so a cancel arriving at this very moment is not lost.
+  detail::Connection& writer = state_->database->writer();
+  writer
+      .cached(
+          "UPDATE sessions SET outcome = ?, ended_at = ? "
+          "WHERE client_id = ? AND token = ? AND outcome = ? AND cancel_requested = 0")
+      .bind(1, detail::storedOutcome(SessionOutcome::Finished))
+      .bind(2, detail::unixNow())
+      .bind(3, state_->clientIdentifier)
+      .bind(4, state_->token)
+      .bind(5, detail::storedOutcome(SessionOutcome::Running))
+      .run();
+  if (writer.changes() == 0) {
+    state_->phase = detail::SessionState::Phase::CancelSeen;
+    state_->ensureRunning();
+  }
+  state_->phase = detail::SessionState::Phase::Finished;
+}
+
+void Session::cancelSyncing() {
+  using Phase = detail::SessionState::Phase;
+  if (state_->phase == Phase::Finished || state_->phase == Phase::Cancelled) return;
+  state_->phase = Phase::Cancelled;
+  state_->end(SessionOutcome::Cancelled);
+}
+
+bool Session::isCancelled() {
+  using Phase = detail::SessionState::Phase;
+  if (state_->phase == Phase::Running && state_->cancelRequested()) {
+    state_->phase = Phase::CancelSeen;
+  }
+  return state_->phase == Phase::CancelSeen || state_->phase == Phase::Cancelled;
+}
+
+std::shared_ptr<Snapshot> Session::snapshotOfRecordsInTruth() {
+  state_->ensureRunning();
+  return state_->snapshot;
+}
+
+}  // namespace tessel

@@ -1,0 +1,317 @@
+#include "tessel/store.h"
+
+#include <cstdlib>
+#include <unordered_set>
+
+#include "tessel/database.h"
+#include "tessel/exception.h"
+#include "tessel/process_identity.h"
+#include "tessel/read_view.h"
+#include "tessel/schema.h"
+#include "tessel/session_outcome_codes.h"
+#include "tessel/value_codec.h"
+
+namespace tessel {
+
+namespace {
+
+using zt::platform::Dictionary;
+using zt::platform::Value;
+
+// The identifier the CalendarOrder record gets when the store has none yet.
+constexpr std::string_view kCalendarOrderIdentifier = "tessel.calendars.order";
+
+std::optional<std::string> environment(const char* name) {
+  const char* value = std::getenv(name);
+  if (!value || !*value) return std::nullopt;
+  return std::string(value);
+}
+
+std::string entityOf(const Record& record) {
+  const Value* entity = record.record.find(TesselRecordEntityNameKey);
+  if (!entity || !entity->asString() || entity->asString()->empty()) {
+    throw Exception(
+        TesselInvalidRecordException,
+        "record " + record.id + " names no entity under " + std::string(TesselRecordEntityNameKey));
+  }
+  return *entity->asString();
+}
+
+// Takes the next generation number; the caller writes the counter back before committing.
+class GenerationCounter {
+ public:
+  explicit GenerationCounter(detail::Connection& connection) : connection_(connection) {
+    auto& query = connection_.cached("SELECT generation FROM store_state WHERE id = 1");
+    detail::StatementReset reset(query);
+    if (query.step()) value_ = query.integer(0);
+  }
+  std::int64_t next() { return ++value_; }
+  void undo() { --value_; }
+  void save() {
+    connection_.cached("UPDATE store_state SET generation = ? WHERE id = 1").bind(1, value_).run();
+  }
+
+ private:
+  detail::Connection& connection_;
+  std::int64_t value_ = 0;
+};
+
+// Inserts or replaces records inside the caller's transaction; answers how many changed.
+std::size_t writeRecords(detail::Connection& writer, const std::vector<Record>& records,
+                         const std::vector<std::string>& entities) {
+  GenerationCounter generation(writer);
+  // The WHERE clause leaves a record that is already stored exactly so untouched, so that
+  // writing the same data again offers the clients no change.
+  auto& upsert = writer.cached(
+      "INSERT INTO records(id, entity, generation, deleted, data) VALUES (?1, ?2, ?3, 0, ?4) "
+      "ON CONFLICT(id) DO UPDATE SET entity = excluded.entity, generation = excluded.generation, "
+      "deleted = 0, data = excluded.data "
+      "WHERE records.deleted <> 0 OR records.entity <> excluded.entity "
+      "OR records.data IS NOT excluded.data");
+  std::size_t written = 0;
+  std::vector<std::uint8_t> bytes;
+  for (std::size_t i = 0; i < records.size(); ++i) {
+    bytes.clear();
+    detail::ValueWriter(bytes).record(records[i].record);
+    upsert.bind(1, records[i].id)
+        .bind(2, entities[i])
+        .bind(3, generation.next())
+        .bindBlob(4, bytes);
+    upsert.run();
+    if (writer.changes() > 0) {
+      ++written;
+    } else {
+      generation.undo();
+    }
+  }
+  generation.save();
+  return written;
+}
+
+}  // namespace
+
+std::filesystem::path Store::resolvePath(const std::optional<std::filesystem::path>& given) {
+  if (given && !given->empty()) return *given;
+  if (auto path = environment("TESSEL_STORE")) return *path;
+  if (auto data = environment("XDG_DATA_HOME")) {
+    return std::filesystem::path(*data) / "tessel" / "truth.db";
+  }
+  if (auto home = environment("HOME")) {
+    return std::filesystem::path(*home) / ".local" / "share" / "tessel" / "truth.db";
+  }
+  throw Exception(TesselStoreException,
+                  "no store path: neither --store, $TESSEL_STORE, $XDG_DATA_HOME nor $HOME");
+}
+
+std::unique_ptr<Store> Store::open(const std::filesystem::path& path, StoreOpening opening) {
+  return std::make_unique<Store>(std::make_shared<detail::Database>(path, opening));
+}
+
+Store::Store(std::shared_ptr<detail::Database> database) : database_(std::move(database)) {}
+
+Store::~Store() = default;
+
+const std::filesystem::path& Store::path() const {
+  return database_->path();
+}
+
+int Store::schemaVersion() const {
+  return database_->schemaVersion();
+}
+
+std::int64_t Store::generation() const {
+  auto& query = database_->writer().cached("SELECT generation FROM store_state WHERE id = 1");
+  detail::StatementReset reset(query);
+  return query.step() ? query.integer(0) : 0;
+}
+
+std::size_t Store::putRecords(const std::vector<Record>& records) {
+  // Check every record before touching the store.
+  std::vector<std::string> entities;
+  entities.reserve(records.size());
+  for (const Record& record : records) {
+    if (record.id.empty()) throw Exception(TesselInvalidRecordException, "empty record identifier");
+    entities.push_back(entityOf(record));
+  }
+  detail::Connection& writer = database_->writer();
+  detail::WriteTransaction transaction(writer);
+  std::size_t written = writeRecords(writer, records, entities);
+  transaction.commit();
+  return written;
+}
+
+std::size_t Store::deleteRecords(const std::vector<std::string>& identifiers,
+                                 MissingRecords missing) {
+  detail::Connection& writer = database_->writer();
+  detail::WriteTransaction transaction(writer);
+  GenerationCounter generation(writer);
+  auto& tombstone = writer.cached(
+      "UPDATE records SET deleted = 1, data = NULL, generation = ? WHERE id = ? AND deleted = 0");
+  std::size_t deleted = 0;
+  for (const std::string& identifier : identifiers) {
+    tombstone.bind(1, generation.next()).bind(2, identifier).run();
+    if (writer.changes() > 0) {
+      ++deleted;
+      continue;
+    }
+    generation.undo();
+    if (missing == MissingRecords::Fail) {
+      throw Exception(TesselUnknownRecordException, "no record " + identifier);
+    }
+  }
+  generation.save();
+  transaction.commit();
+  return deleted;
+}
+
+std::optional<Dictionary> Store::record(std::string_view identifier) const {
+  auto& query = database_->writer().cached("SELECT data FROM records WHERE id = ? AND deleted = 0");
+  detail::StatementReset reset(query);
+  query.bind(1, identifier);
+  if (!query.step()) return std::nullopt;
+  return detail::decodeRecord(query.blob(0));
+}
+
+void Store::forEachRecord(const std::function<void(const Record&)>& visit,
+                          std::optional<std::string_view> entityName) const {
+  // A read view of its own keeps the listing consistent and leaves the writer connection free
+  // for whatever the visitor does.
+  detail::ReadView view(*database_);
+  detail::Statement query(
+      view.connection(),
+      entityName ? "SELECT id, data FROM records WHERE deleted = 0 AND entity = ? ORDER BY id"
+                 : "SELECT id, data FROM records WHERE deleted = 0 ORDER BY id");
+  if (entityName) query.bind(1, *entityName);
+  Record record;
+  while (query.step()) {
+    record.id = query.text(0);
+    record.record = detail::decodeRecord(query.blob(1));
+    visit(record);
+  }
+}
+
+std::size_t Store::recordCount(std::optional<std::string_view> entityName) const {
+  auto& query = database_->writer().cached(
+      entityName ? "SELECT count(*) FROM records WHERE deleted = 0 AND entity = ?"
+                 : "SELECT count(*) FROM records WHERE deleted = 0");
+  detail::StatementReset reset(query);
+  if (entityName) query.bind(1, *entityName);
+  return query.step() ? static_cast<std::size_t>(query.integer(0)) : 0;
+}
+
+void Store::setCalendarOrder(const std::vector<std::string>& calendarIdentifiers) {
+  detail::Connection& writer = database_->writer();
+  // One transaction for the check and the write, so no calendar vanishes in between.
+  detail::WriteTransaction transaction(writer);
+  auto& calendar = writer.cached("SELECT entity FROM records WHERE id = ? AND deleted = 0");
+  zt::platform::Array order;
+  for (const std::string& identifier : calendarIdentifiers) {
+    detail::StatementReset reset(calendar);
+    calendar.bind(1, identifier);
+    if (!calendar.step() || calendar.text(0) != TesselEntity_Calendars_Calendar) {
+      throw Exception(TesselUnknownRecordException, "no calendar " + identifier);
+    }
+    order.emplace_back(identifier);
+  }
+  std::string identifier(kCalendarOrderIdentifier);
+  {
+    auto& existing = writer.cached(
+        "SELECT id FROM records WHERE entity = ? AND deleted = 0 ORDER BY generation LIMIT 1");
+    detail::StatementReset reset(existing);
+    existing.bind(1, TesselEntity_Calendars_CalendarOrder);
+    if (existing.step()) identifier = existing.text(0);
+  }
+  Dictionary record{
+      {std::string(TesselRecordEntityNameKey), Value(TesselEntity_Calendars_CalendarOrder)},
+      {std::string(TesselRelationship_Calendars_CalendarOrder_Calendars), Value(std::move(order))}};
+  std::vector<Record> records{Record{identifier, std::move(record)}};
+  writeRecords(writer, records, {std::string(TesselEntity_Calendars_CalendarOrder)});
+  transaction.commit();
+}
+
+std::unique_ptr<Client> Store::registerClient(std::string_view identifier,
+                                              std::string_view displayName,
+                                              const std::vector<std::string>& entityNames) {
+  if (identifier.empty()) throw Exception(TesselUnknownClientException, "empty client identifier");
+  detail::Connection& writer = database_->writer();
+  detail::WriteTransaction transaction(writer);
+  writer
+      .cached(
+          "INSERT INTO clients(id, display_name, registered_at) VALUES (?, ?, ?) "
+          "ON CONFLICT(id) DO UPDATE SET display_name = excluded.display_name")
+      .bind(1, identifier)
+      .bind(2, displayName)
+      .bind(3, detail::unixNow())
+      .run();
+  writer.cached("DELETE FROM client_entities WHERE client_id = ?").bind(1, identifier).run();
+  auto& insert =
+      writer.cached("INSERT OR IGNORE INTO client_entities(client_id, entity) VALUES (?, ?)");
+  for (const std::string& entity : entityNames) insert.bind(1, identifier).bind(2, entity).run();
+  transaction.commit();
+  return std::make_unique<Client>(database_, std::string(identifier));
+}
+
+std::unique_ptr<Client> Store::clientWithIdentifier(std::string_view identifier) const {
+  auto& query = database_->writer().cached("SELECT 1 FROM clients WHERE id = ?");
+  detail::StatementReset reset(query);
+  query.bind(1, identifier);
+  if (!query.step()) return nullptr;
+  return std::make_unique<Client>(database_, std::string(identifier));
+}
+
+std::vector<std::string> Store::clientIdentifiers() const {
+  auto& query = database_->writer().cached("SELECT id FROM clients ORDER BY id");
+  detail::StatementReset reset(query);
+  std::vector<std::string> identifiers;
+  while (query.step()) identifiers.emplace_back(query.text(0));
+  return identifiers;
+}
+
+bool Store::cancelSession(std::string_view clientIdentifier) {
+  detail::Connection& writer = database_->writer();
+  detail::WriteTransaction transaction(writer);
+  {
+    auto& client = writer.cached("SELECT 1 FROM clients WHERE id = ?");
+    detail::StatementReset reset(client);
+    client.bind(1, clientIdentifier);
+    if (!client.step()) {
+      throw Exception(TesselUnknownClientException, "no client " + std::string(clientIdentifier));
+    }
+  }
+  detail::ProcessIdentity owner{0, 0};
+  {
+    auto& session = writer.cached(
+        "SELECT owner_pid, owner_start FROM sessions WHERE client_id = ? AND outcome = ?");
+    detail::StatementReset reset(session);
+    session.bind(1, clientIdentifier).bind(2, detail::storedOutcome(SessionOutcome::Running));
+    if (!session.step()) return false;
+    owner = {static_cast<long>(session.integer(0)), session.integer(1)};
+  }
+  if (owner.isAlive()) {
+    // The owner sees the request and ends the session itself.
+    writer.cached("UPDATE sessions SET cancel_requested = 1 WHERE client_id = ?")
+        .bind(1, clientIdentifier)
+        .run();
+  } else {
+    writer
+        .cached(
+            "UPDATE sessions SET cancel_requested = 1, outcome = ?, ended_at = ? "
+            "WHERE client_id = ?")
+        .bind(1, detail::storedOutcome(SessionOutcome::Cancelled))
+        .bind(2, detail::unixNow())
+        .bind(3, clientIdentifier)
+        .run();
+  }
+  transaction.commit();
+  return true;
+}
+
+std::shared_ptr<Snapshot> Store::snapshotOfRecordsInTruth(
+    const std::vector<std::string>& entityNames, const Client& client) const {
+  if (!clientWithIdentifier(client.identifier())) {
+    throw Exception(TesselUnknownClientException, "no client " + client.identifier());
+  }
+  return std::make_shared<Snapshot>(std::make_shared<detail::ReadView>(*database_), entityNames);
+}
+
+}  // namespace tessel

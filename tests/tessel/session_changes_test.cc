@@ -1,0 +1,212 @@
+#include "tessel/exception.h"
+#include "tessel/opaque_filter.h"
+#include "tessel/schema.h"
+#include "tessel/test_store.h"
+
+namespace tessel::testing {
+namespace {
+
+using zt::platform::Dictionary;
+using zt::platform::Value;
+
+const std::vector<std::string> kContacts{std::string(TesselEntity_Contacts_Contact),
+                                         std::string(TesselEntity_Contacts_Group)};
+
+class SessionChanges : public StoreTest {
+ protected:
+  void SetUp() override {
+    StoreTest::SetUp();
+    client_ = store_->registerClient("Z1", "Player", kContacts);
+  }
+
+  // One whole session as the tool runs it: prepare, accept each change as it is enumerated,
+  // commit, finish.
+  std::vector<std::string> syncAll() {
+    auto session = Session::begin(*client_, kContacts);
+    session->prepareToPullChanges(kContacts);
+    std::vector<Change> changes;
+    ChangeEnumerator enumerator = session->changeEnumerator(kContacts);
+    while (auto change = enumerator.next()) {
+      session->clientAcceptedChanges(change->recordIdentifier);
+      changes.push_back(std::move(*change));
+    }
+    session->clientCommittedAcceptedChanges();
+    session->finishSyncing();
+    return summary(changes);
+  }
+
+  std::unique_ptr<Client> client_;
+};
+
+TEST_F(SessionChanges, AddsModifiesAndDeletesFollowTruthInTheOrderItChanged) {
+  store_->putRecords({contact("c2", "Bob"), contact("c1", "Ann"), group("g1", "Friends")});
+  EXPECT_EQ(syncAll(), (std::vector<std::string>{"A:c2", "A:c1", "A:g1"}));
+  EXPECT_EQ(client_->mirrorSize(), 3u);
+  EXPECT_TRUE(syncAll().empty());
+
+  store_->putRecords({contact("c1", "Anne")});
+  store_->deleteRecords({"c2"});
+  store_->putRecords({contact("c3", "Cy")});
+  auto session = Session::begin(*client_, kContacts);
+  session->prepareToPullChanges(kContacts);
+  auto changes = drain(*session, kContacts);
+  EXPECT_EQ(summary(changes), (std::vector<std::string>{"M:c1", "D:c2", "A:c3"}));
+  ASSERT_TRUE(changes[0].record);
+  EXPECT_EQ(*changes[0].record->find(TesselAttribute_Contacts_Contact_FirstName), Value("Anne"));
+  EXPECT_EQ(changes[0].entityName, TesselEntity_Contacts_Contact);
+  EXPECT_FALSE(changes[1].record);
+}
+
+TEST_F(SessionChanges, EnumeratorsAndPreparationKeepToTheirEntities) {
+  store_->putRecords({contact("c1", "Ann"), group("g1", "Friends")});
+  auto session = Session::begin(*client_, kContacts);
+  session->prepareToPullChanges({std::string(TesselEntity_Contacts_Group)});
+  EXPECT_EQ(summary(drain(*session, kContacts)), (std::vector<std::string>{"A:g1"}));
+  session->prepareToPullChanges(kContacts);
+  EXPECT_EQ(summary(drain(*session, {std::string(TesselEntity_Contacts_Contact)})),
+            (std::vector<std::string>{"A:c1"}));
+}
+
+TEST_F(SessionChanges, ARecordAFilterNowRefusesBecomesADeleteAndComesBackWhenAllowed) {
+  store_->putRecords({contact("c1", "Ann"), contact("c2", "Bob"), group("g1", "Friends")});
+  client_->setFilters({std::make_shared<NameFilter>(std::vector<std::string>{"Bob"})});
+  EXPECT_EQ(syncAll(), (std::vector<std::string>{"A:c1", "A:g1"}));
+
+  client_->setFilters({std::make_shared<NameFilter>(std::vector<std::string>{"Ann"})});
+  EXPECT_EQ(syncAll(), (std::vector<std::string>{"D:c1", "A:c2"}));
+
+  // The filter judges only contacts: a group is never refused.
+  client_->setFilters({std::make_shared<NameFilter>(std::vector<std::string>{"Friends"})});
+  EXPECT_EQ(syncAll(), (std::vector<std::string>{"A:c1"}));
+}
+
+TEST_F(SessionChanges, EveryFilterOfTheEntityMustAccept) {
+  store_->putRecords({contact("c1", "Ann"), contact("c2", "Bob"), contact("c3", "Cy")});
+  client_->setFilters({std::make_shared<NameFilter>(std::vector<std::string>{"Ann"}),
+                       std::make_shared<OpaqueFilter>("Foreign", zt::platform::Data{1, 2}),
+                       std::make_shared<NameFilter>(std::vector<std::string>{"Bob"})});
+  EXPECT_EQ(syncAll(), (std::vector<std::string>{"A:c3"}));
+}
+
+TEST_F(SessionChanges, ReplaceModeDeliversEveryPassingRecordAsAnAdd) {
+  store_->putRecords({contact("c1", "Ann"), contact("c2", "Bob")});
+  EXPECT_EQ(syncAll(), (std::vector<std::string>{"A:c1", "A:c2"}));
+  store_->deleteRecords({"c2"});
+  client_->setFilters({std::make_shared<NameFilter>(std::vector<std::string>{"Cy"})});
+  store_->putRecords({contact("c3", "Cy"), contact("c4", "Dee")});
+
+  client_->shouldReplaceClientRecords({std::string(TesselEntity_Contacts_Contact)});
+  auto changes = syncAll();
+  EXPECT_EQ(changes, (std::vector<std::string>{"A:c1", "A:c4"}));
+  // The client now holds exactly what was delivered: c2 (deleted) is forgotten, and a normal
+  // session afterwards has nothing to say.
+  EXPECT_EQ(client_->mirrorSize(), 2u);
+  auto plain = store_->clientWithIdentifier("Z1");
+  auto session = Session::begin(*plain, kContacts);
+  session->prepareToPullChanges(kContacts);
+  EXPECT_TRUE(drain(*session, kContacts).empty());
+}
+
+TEST_F(SessionChanges, OnlyAcceptedChangesAreCommittedAndTheOthersComeBack) {
+  store_->putRecords({contact("c1", "Ann"), contact("c2", "Bob"), contact("c3", "Cy")});
+  {
+    auto session = Session::begin(*client_, kContacts);
+    session->prepareToPullChanges(kContacts);
+    EXPECT_EQ(drain(*session, kContacts).size(), 3u);
+    session->clientAcceptedChanges("c2");
+    session->clientAcceptedChanges("not a change");
+    session->clientCommittedAcceptedChanges();
+    // A committed change is not offered again in the same session.
+    EXPECT_EQ(summary(drain(*session, kContacts)), (std::vector<std::string>{"A:c1", "A:c3"}));
+    session->finishSyncing();
+  }
+  EXPECT_EQ(client_->mirrorSize(), 1u);
+  EXPECT_EQ(syncAll(), (std::vector<std::string>{"A:c1", "A:c3"}));
+}
+
+TEST_F(SessionChanges, CancelDropsAcceptancesThatWereNotCommitted) {
+  store_->putRecords({contact("c1", "Ann"), contact("c2", "Bob")});
+  {
+    auto session = Session::begin(*client_, kContacts);
+    session->prepareToPullChanges(kContacts);
+    session->clientAcceptedChanges("c1");
+    session->clientCommittedAcceptedChanges();
+    session->clientAcceptedChanges("c2");
+    session->cancelSyncing();
+    EXPECT_TRUE(session->isCancelled());
+    try {
+      session->clientCommittedAcceptedChanges();
+      FAIL() << "no exception";
+    } catch (const Exception& e) {
+      EXPECT_EQ(e.name(), TesselSessionCancelledException);
+    }
+    session->cancelSyncing();  // ending twice is harmless
+  }
+  EXPECT_EQ(client_->mirrorSize(), 1u);
+  EXPECT_EQ(client_->lastSession()->outcome, SessionOutcome::Cancelled);
+  EXPECT_EQ(syncAll(), (std::vector<std::string>{"A:c2"}));
+  EXPECT_EQ(client_->lastSession()->outcome, SessionOutcome::Finished);
+}
+
+TEST_F(SessionChanges, OneSessionPerClientAndEndedSessionsRefuseFurtherCalls) {
+  auto other = store_->registerClient("Z2", "Other", kContacts);
+  auto session = Session::begin(*client_, kContacts);
+  try {
+    Session::begin(*client_, kContacts);
+    FAIL() << "no exception";
+  } catch (const Exception& e) {
+    EXPECT_EQ(e.name(), TesselSessionRunningException);
+  }
+  // Another client is not blocked.
+  Session::begin(*other, kContacts)->finishSyncing();
+
+  session->finishSyncing();
+  EXPECT_FALSE(session->isCancelled());
+  EXPECT_THROW(session->prepareToPullChanges(kContacts), Exception);
+  Session::begin(*client_, kContacts)->finishSyncing();
+
+  // A session dropped without an ending is cancelled and frees the client.
+  Session::begin(*client_, kContacts).reset();
+  EXPECT_EQ(client_->lastSession()->outcome, SessionOutcome::Cancelled);
+  Session::begin(*client_, kContacts)->finishSyncing();
+}
+
+TEST_F(SessionChanges, TheSessionSnapshotAnswersRecordsAndReferences) {
+  store_->putRecords({contact("c1", "Ann", {"g1"}), contact("c2", "Bob"), group("g1", "Friends")});
+  auto session = Session::begin(*client_, {std::string(TesselEntity_Contacts_Contact)});
+  auto snapshot = session->snapshotOfRecordsInTruth();
+  EXPECT_EQ(snapshot, session->snapshotOfRecordsInTruth());
+
+  auto contacts = snapshot->recordsMatchingAttributes(
+      Dictionary{{std::string(TesselRecordEntityNameKey), TesselEntity_Contacts_Contact}});
+  EXPECT_EQ(contacts.size(), 2u);
+  auto bob = snapshot->recordsMatchingAttributes(
+      Dictionary{{std::string(TesselAttribute_Contacts_Contact_FirstName), "Bob"}});
+  ASSERT_EQ(bob.size(), 1u);
+  EXPECT_EQ(bob.begin()->first, "c2");
+  // Groups are outside this session's entities.
+  EXPECT_TRUE(snapshot
+                  ->recordsMatchingAttributes(Dictionary{
+                      {std::string(TesselRecordEntityNameKey), TesselEntity_Contacts_Group}})
+                  .empty());
+  auto some = snapshot->recordsWithIdentifiers({"c2", "nope", "g1", "c1"});
+  EXPECT_EQ(some.size(), 2u);
+
+  auto reference = snapshot->recordReferenceForRecordIdentifier("c1");
+  ASSERT_TRUE(reference);
+  EXPECT_EQ(snapshot->recordIdentifierForReference(*reference), "c1");
+  EXPECT_FALSE(snapshot->recordReferenceForRecordIdentifier("nope"));
+  EXPECT_FALSE(snapshot->recordIdentifierForReference(RecordReference::fromText("junk")));
+  session->finishSyncing();
+
+  // A reference outlives the snapshot, and the record's modification, while the record lives.
+  store_->putRecords({contact("c1", "Anne")});
+  auto later = store_->snapshotOfRecordsInTruth({}, *client_);
+  EXPECT_EQ(later->recordIdentifierForReference(*reference), "c1");
+  store_->deleteRecords({"c1"});
+  EXPECT_FALSE(
+      store_->snapshotOfRecordsInTruth({}, *client_)->recordIdentifierForReference(*reference));
+}
+
+}  // namespace
+}  // namespace tessel::testing

@@ -1,0 +1,254 @@
+#include <sqlite3.h>
+#include <stdlib.h>
+
+#include <cmath>
+#include <fstream>
+
+#include "platform/calendar_date.h"
+#include "tessel/exception.h"
+#include "tessel/schema.h"
+#include "tessel/test_store.h"
+
+namespace tessel::testing {
+namespace {
+
+using zt::platform::Array;
+using zt::platform::CalendarDate;
+using zt::platform::Data;
+using zt::platform::Dictionary;
+using zt::platform::Number;
+using zt::platform::TimeZone;
+using zt::platform::Url;
+using zt::platform::Value;
+
+CalendarDate dateIn(const TimeZone& zone, CalendarDate::Fields fields,
+                    std::uint32_t nanoseconds = 0) {
+  CalendarDate date = CalendarDate::fromFields(fields, zone);
+  return CalendarDate(date.instant(), zone, nanoseconds);
+}
+
+// Keys deliberately out of alphabetical order: the order is part of the record.
+Dictionary everyKind() {
+  return Dictionary{
+      {std::string(TesselRecordEntityNameKey), TesselEntity_Calendars_Event},
+      {"zeta", "UTF-8 text: \xc3\xa9t\xc3\xa9"},
+      {"empty", ""},
+      {"integer", Value::integer(-9007199254740993)},
+      {"big", Value::integer(INT64_MIN)},
+      {"real", Value::real(2.5)},
+      {"negative zero", Value::real(-0.0)},
+      {"yes", Value::boolean(true)},
+      {"no", Value::boolean(false)},
+      {"one", Value::integer(1)},
+      {"named", dateIn(*TimeZone::named("Europe/Paris"), {2007, 3, 15, 12, 30, 0}, 123456789)},
+      {"gmt", dateIn(TimeZone::gmt(), {2007, 3, 15, 12, 0, 0})},
+      {"utc", dateIn(TimeZone::utc(), {2007, 3, 15, 12, 0, 0})},
+      {"floating", dateIn(TimeZone::local(), {2030, 1, 2, 3, 4, 5})},
+      {"unnamed",
+       dateIn(*TimeZone::unnamed(3600, 7200, "M3.5.0,M10.5.0/3"), {2007, 7, 1, 9, 0, 0})},
+      {"fixed", dateIn(*TimeZone::unnamed(-18000), {2007, 7, 1, 9, 0, 0})},
+      {"far future", dateIn(TimeZone::gmt(), {4500, 1, 1, 0, 0, 0})},
+      {"before epoch", dateIn(TimeZone::gmt(), {1601, 1, 1, 0, 0, 0})},
+      {"url", Url{"https://example.org/x?y=1"}},
+      {"url looking text", "https://example.org/x?y=1"},
+      {"data", Data{0x00, 0xff, 0x10, 0x00}},
+      {"empty data", Data{}},
+      {"array", Array{"a", Value::integer(2), Array{}, Dictionary{{"k", "v"}}}},
+      {"dictionary", Dictionary{{"b", "2"}, {"a", "1"}}},
+  };
+}
+
+using StoreRecords = StoreTest;
+
+TEST_F(StoreRecords, EveryValueKindAndKeyOrderSurviveTheStoreAndAReopen) {
+  Dictionary original = everyKind();
+  ASSERT_EQ(store_->putRecords({{"event-1", original}}), 1u);
+  store_.reset();
+  store_ = Store::open(storePath_, StoreOpening::MustExist);
+  auto back = store_->record("event-1");
+  ASSERT_TRUE(back);
+  EXPECT_EQ(*back, original);
+
+  std::vector<std::string> keys;
+  for (const auto& entry : *back) keys.push_back(entry.first);
+  std::vector<std::string> expected;
+  for (const auto& entry : original) expected.push_back(entry.first);
+  EXPECT_EQ(keys, expected);
+  // Equality of numbers and zones could hide a change of kind; check the kinds themselves.
+  EXPECT_EQ(back->find("one")->asNumber()->kind(), Number::Kind::Integer);
+  EXPECT_EQ(back->find("yes")->asNumber()->kind(), Number::Kind::Boolean);
+  EXPECT_EQ(back->find("real")->asNumber()->kind(), Number::Kind::Real);
+  EXPECT_TRUE(std::signbit(back->find("negative zero")->asNumber()->doubleValue()));
+  EXPECT_EQ(back->find("named")->asDate()->nanoseconds(), 123456789u);
+  EXPECT_TRUE(back->find("floating")->asDate()->timeZone().isLocal());
+  EXPECT_EQ(back->find("gmt")->asDate()->timeZone().name(), "GMT");
+  EXPECT_EQ(back->find("utc")->asDate()->timeZone().name(), "UTC");
+  EXPECT_EQ(back->find("unnamed")->asDate()->timeZone().daylightRule(), "M3.5.0,M10.5.0/3");
+  EXPECT_FALSE(back->find("fixed")->asDate()->timeZone().daylightOffset());
+  EXPECT_EQ(back->find("url")->kind(), Value::Kind::Url);
+  EXPECT_EQ(back->find("url looking text")->kind(), Value::Kind::String);
+  EXPECT_EQ(back->find("empty data")->kind(), Value::Kind::Data);
+}
+
+TEST_F(StoreRecords, GenerationsGrowWithChangesOnlyAndDeletesLeaveTombstones) {
+  store_->putRecords({contact("c1", "Ann"), contact("c2", "Bob")});
+  std::int64_t afterPut = store_->generation();
+  EXPECT_EQ(afterPut, 2);
+
+  // Writing identical data again changes nothing.
+  EXPECT_EQ(store_->putRecords({contact("c1", "Ann"), contact("c2", "Bobby")}), 1u);
+  EXPECT_EQ(store_->generation(), afterPut + 1);
+
+  EXPECT_EQ(store_->deleteRecords({"c1", "unknown"}), 1u);
+  EXPECT_FALSE(store_->record("c1"));
+  EXPECT_EQ(store_->recordCount(), 1u);
+  EXPECT_EQ(store_->generation(), afterPut + 2);
+  // Deleting again is not a change.
+  EXPECT_EQ(store_->deleteRecords({"c1"}), 0u);
+
+  // A failing delete of several records deletes none of them.
+  EXPECT_THROW(store_->deleteRecords({"c2", "missing"}, MissingRecords::Fail), Exception);
+  EXPECT_TRUE(store_->record("c2"));
+
+  // A record put again after its deletion lives again.
+  store_->putRecords({contact("c1", "Ann")});
+  EXPECT_TRUE(store_->record("c1"));
+}
+
+TEST_F(StoreRecords, ARecordWithoutEntityIsRefusedAndNothingOfItsBatchIsWritten) {
+  Record bad{"x", Dictionary{{"first name", "Nobody"}}};
+  try {
+    store_->putRecords({contact("c1", "Ann"), bad});
+    FAIL() << "no exception";
+  } catch (const Exception& e) {
+    EXPECT_EQ(e.name(), TesselInvalidRecordException);
+  }
+  EXPECT_EQ(store_->recordCount(), 0u);
+}
+
+TEST_F(StoreRecords, ListingIsByIdentifierAndCanBeLimitedToOneEntity) {
+  store_->putRecords({contact("c2", "Bob"), group("g1", "Friends"), contact("c1", "Ann")});
+  std::vector<std::string> all, contacts;
+  store_->forEachRecord([&](const Record& r) { all.push_back(r.id); });
+  store_->forEachRecord([&](const Record& r) { contacts.push_back(r.id); },
+                        TesselEntity_Contacts_Contact);
+  EXPECT_EQ(all, (std::vector<std::string>{"c1", "c2", "g1"}));
+  EXPECT_EQ(contacts, (std::vector<std::string>{"c1", "c2"}));
+}
+
+TEST_F(StoreRecords, TheCalendarOrderIsOneRecordThatNamesLiveCalendarsOnly) {
+  auto calendar = [](std::string id) {
+    return Record{
+        id, Dictionary{{std::string(TesselRecordEntityNameKey), TesselEntity_Calendars_Calendar},
+                       {"title", id}}};
+  };
+  store_->putRecords({calendar("k1"), calendar("k2")});
+  store_->setCalendarOrder({"k2", "k1"});
+  store_->setCalendarOrder({"k1", "k2"});
+  EXPECT_EQ(store_->recordCount(TesselEntity_Calendars_CalendarOrder), 1u);
+  std::optional<Dictionary> order;
+  store_->forEachRecord([&](const Record& r) { order = r.record; },
+                        TesselEntity_Calendars_CalendarOrder);
+  ASSERT_TRUE(order);
+  EXPECT_EQ(*order->find(TesselRelationship_Calendars_CalendarOrder_Calendars),
+            Value(Array{"k1", "k2"}));
+  EXPECT_THROW(store_->setCalendarOrder({"k1", "nope"}), Exception);
+}
+
+using StoreClients = StoreTest;
+
+TEST_F(StoreClients, SettingsKeepTheirTypeAndSurviveAReopen) {
+  auto client =
+      store_->registerClient("Z1", "Player", {std::string(TesselEntity_Contacts_Contact)});
+  CalendarDate when(std::chrono::sys_seconds(std::chrono::seconds(1700000000)), TimeZone::gmt(),
+                    987654321);
+  client->setSetting("LastSyncToolVersion", Value::integer(38));
+  client->setSetting("SyncContactPicturesEnabled", Value::boolean(true));
+  client->setSetting("LastModDateForVCF", when);
+  client->setSetting("Gone", "soon");
+  client->unsetSetting("Gone");
+  client.reset();
+  store_ = Store::open(storePath_);
+
+  client = store_->clientWithIdentifier("Z1");
+  ASSERT_TRUE(client);
+  EXPECT_EQ(client->displayName(), "Player");
+  EXPECT_TRUE(client->isEnabledForEntityName(TesselEntity_Contacts_Contact));
+  EXPECT_FALSE(client->isEnabledForEntityName(TesselEntity_Calendars_Calendar));
+  EXPECT_EQ(client->setting("LastSyncToolVersion")->asNumber()->kind(), Number::Kind::Integer);
+  EXPECT_EQ(client->setting("SyncContactPicturesEnabled"), Value::boolean(true));
+  EXPECT_EQ(client->setting("LastModDateForVCF"), Value(when));
+  EXPECT_FALSE(client->setting("Gone"));
+  EXPECT_EQ(client->settings().size(), 3u);
+  EXPECT_FALSE(store_->clientWithIdentifier("Z2"));
+}
+
+TEST_F(StoreClients, RegisteringAgainUpdatesNameAndEntitiesButKeepsSettings) {
+  auto client = store_->registerClient("Z1", "Old", {std::string(TesselEntity_Contacts_Contact)});
+  client->setSetting("k", Value::integer(1));
+  client = store_->registerClient("Z1", "New", {std::string(TesselEntity_Calendars_Calendar)});
+  EXPECT_EQ(client->displayName(), "New");
+  EXPECT_EQ(client->enabledEntityNames(),
+            (std::vector<std::string>{std::string(TesselEntity_Calendars_Calendar)}));
+  EXPECT_EQ(client->setting("k"), Value::integer(1));
+  EXPECT_EQ(store_->clientIdentifiers(), (std::vector<std::string>{"Z1"}));
+}
+
+using StoreFile = StoreTest;
+
+TEST_F(StoreFile, PathRulesFollowOptionThenEnvironment) {
+  auto saved = [](const char* name) {
+    const char* value = getenv(name);
+    return value ? std::optional<std::string>(value) : std::nullopt;
+  };
+  auto store = saved("TESSEL_STORE"), data = saved("XDG_DATA_HOME"), home = saved("HOME");
+  setenv("TESSEL_STORE", "/s/truth.db", 1);
+  setenv("XDG_DATA_HOME", "/xdg", 1);
+  setenv("HOME", "/home/u", 1);
+  EXPECT_EQ(Store::resolvePath(std::filesystem::path("/given.db")), "/given.db");
+  EXPECT_EQ(Store::resolvePath(), "/s/truth.db");
+  unsetenv("TESSEL_STORE");
+  EXPECT_EQ(Store::resolvePath(), "/xdg/tessel/truth.db");
+  unsetenv("XDG_DATA_HOME");
+  EXPECT_EQ(Store::resolvePath(), "/home/u/.local/share/tessel/truth.db");
+  auto restore = [](const char* name, const std::optional<std::string>& value) {
+    if (value) {
+      setenv(name, value->c_str(), 1);
+    } else {
+      unsetenv(name);
+    }
+  };
+  restore("TESSEL_STORE", store);
+  restore("XDG_DATA_HOME", data);
+  restore("HOME", home);
+}
+
+TEST_F(StoreFile, IsWalWithAVersionedSchemaAndRefusesWhatIsNotAStore) {
+  EXPECT_EQ(store_->schemaVersion(), 1);
+  EXPECT_TRUE(std::filesystem::exists(storePath_.string() + "-wal"));
+
+  EXPECT_THROW(Store::open(folder_ / "absent.db", StoreOpening::MustExist), Exception);
+  EXPECT_FALSE(std::filesystem::exists(folder_ / "absent.db"));
+
+  std::ofstream(folder_ / "garbage.db") << std::string(8192, 'x');
+  try {
+    Store::open(folder_ / "garbage.db");
+    FAIL() << "no exception";
+  } catch (const Exception& e) {
+    EXPECT_EQ(e.name(), TesselStoreException);
+    EXPECT_EQ(e.description(), e.name() + ": " + e.reason());
+  }
+}
+
+TEST_F(StoreFile, AStoreOfANewerSchemaIsRefused) {
+  store_.reset();
+  sqlite3* db = nullptr;
+  ASSERT_EQ(sqlite3_open(storePath_.c_str(), &db), SQLITE_OK);
+  ASSERT_EQ(sqlite3_exec(db, "UPDATE schema_version SET version = 99", nullptr, nullptr, nullptr),
+            SQLITE_OK);
+  sqlite3_close(db);
+  EXPECT_THROW(Store::open(storePath_), Exception);
+}
+
+}  // namespace
+}  // namespace tessel::testing
