@@ -1,0 +1,197 @@
+// The manager's dealings with the player: finding it, its lock, waiting for its volume, and
+// the folders on it.
+#include <chrono>
+#include <cstdio>
+
+#include "platform/log.h"
+#include "sync/sync_status.h"
+#include "sync/zt_sync_manager.h"
+#include "tessel/schema.h"
+
+namespace zt::sync {
+
+using platform::Log;
+
+namespace {
+
+constexpr std::string_view kZetoMode = "ZetoMode";
+// The system mounts the player by itself; the tool only waits this long for it.
+constexpr double kMountWaitSeconds = 20.0;
+
+}  // namespace
+
+bool ZTSyncManager::zetoIDMatchesSyncClientID(const std::string& zetoID) const {
+  return _syncClientID.size() >= zetoID.size() &&
+         _syncClientID.compare(_syncClientID.size() - zetoID.size(), zetoID.size(), zetoID) == 0;
+}
+
+bool ZTSyncManager::checkForConnectedZeto() {
+  if (_zetoRef) return true;
+  Log::debug("Checking that Zeto is connected");
+  std::vector<platform::ZetoRef> devices;
+  if (services_.devices.ZetoCopyConnected(devices) != platform::kZetoSuccess) {
+    Log::debug("Can't get list of connected Zetos");
+    return false;
+  }
+  for (platform::ZetoRef device : devices) {
+    char zetoID[17];
+    std::snprintf(zetoID, sizeof zetoID, "%llX",
+                  static_cast<unsigned long long>(services_.devices.ZetoGetUniqueID(device)));
+    if (zetoIDMatchesSyncClientID(zetoID)) {
+      Log::debug("Zeto is connected");
+      _zetoRef = device;
+      return true;
+    }
+  }
+  Log::debug("Can't find Zeto");
+  return false;
+}
+
+bool ZTSyncManager::lockZeto() {
+  if (_locked) return true;
+  Log::debug("Locking Zeto");
+  if (services_.devices.ZetoAquireLock(*_zetoRef) == platform::kZetoSuccess) {
+    _locked = true;
+    return true;
+  }
+  Log::debug("Can't get a lock on Zeto");
+  return false;
+}
+
+bool ZTSyncManager::unlockZeto() {
+  if (!_locked) return true;
+  Log::debug("Unlocking Zeto");
+  if (services_.devices.ZetoReleaseLock(*_zetoRef) == platform::kZetoSuccess) {
+    _locked = false;
+    return true;
+  }
+  Log::debug("Can't unlock Zeto");
+  return false;
+}
+
+void ZTSyncManager::setZetoIsMounted(bool mounted) {
+  if (_forceMounted != mounted) _forceMounted = mounted;
+}
+
+bool ZTSyncManager::mountZeto() {
+  platform::DeviceLibrary& devices = services_.devices;
+  devices.ZetoRegisterWithServer(services_.runLoop, kZetoMode, zetoEventCallback, this);
+  std::string path;
+  std::int32_t result = devices.ZetoCopyMountpoint(*_zetoRef, path);
+  if (result == kStatusVolumeNotMounted) {
+    Log::debug("Needing to mount Zeto");
+    auto start = std::chrono::steady_clock::now();
+    while (!zetoIsMounted()) {
+      double elapsed =
+          std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
+      if (elapsed > kMountWaitSeconds) {
+        Log::debug("Time outing mounting Zeto");
+        break;
+      }
+      services_.runLoop.runInMode(kZetoMode, kMountWaitSeconds - elapsed,
+                                  platform::RunLoop::ReturnAfter::SourceHandled);
+    }
+    if (!zetoIsMounted()) {
+      devices.ZetoUnregisterFromServer();
+      return false;
+    }
+    result = devices.ZetoCopyMountpoint(*_zetoRef, path);
+  }
+  bool mounted = false;
+  if (result == platform::kZetoSuccess) {
+    if (path.empty()) {
+      Log::debug("Can't get path from URL: %@", path);
+    } else {
+      setPathToZetoVolume(path);
+      mounted = true;
+    }
+  } else {
+    Log::debug("Can't get Zeto mount point");
+  }
+  devices.ZetoUnregisterFromServer();
+  return mounted;
+}
+
+std::optional<std::string> ZTSyncManager::checkForZetoFolder(const std::string& name,
+                                                             bool createIfNeeded) {
+  std::filesystem::path path = std::filesystem::path(_pathToZetoVolume) / name;
+  Log::debug("Checking %@ folder on Zeto", name);
+  const platform::FileSystem& files = services_.files;
+  if (files.exists(path)) {
+    if (files.isDirectory(path)) return path.string();
+    Log::debug("Folder %@ on Zeto is a regular file, we can't use it to sync", name);
+    return std::nullopt;
+  }
+  if (!createIfNeeded) return path.string();
+  Log::debug("Need to create %@ on Zeto", name);
+  if (auto error = files.createDirectory(path, platform::Intermediates::Create)) {
+    Log::debug("Can't create folder. Reason: %@", *error);
+    return std::nullopt;
+  }
+  return path.string();
+}
+
+bool ZTSyncManager::checkZetoPIMPaths() {
+  Log::debug("Checking for PIM paths");
+  if (!mountZeto()) return false;
+  setPathToZetoContactsFolder(checkForZetoFolder("Contacts", true));
+  if (_shouldSyncContacts && !_pathToZetoContactsFolder) setShouldSyncContacts(false);
+  setPathToZetoCalendarsFolder(checkForZetoFolder("Calendars", true));
+  if (_shouldSyncCalendars && !_pathToZetoCalendarsFolder) setShouldSyncCalendars(false);
+  return true;
+}
+
+bool ZTSyncManager::shouldSyncContactImages() {
+  if (!_shouldSyncContactImagesCached) {
+    _cacheShouldSyncContactImages();
+    setShouldSyncContactImagesCached(true);
+  }
+  return _shouldSyncContactImages;
+}
+
+void ZTSyncManager::_cacheShouldSyncContactImages() {
+  if (services_.defaults.boolForKey("AlwaysSyncContactImages").value_or(false)) {
+    Log::debug("Force pushing contact pictures per AlwaysSyncContactImages default");
+    setShouldSyncContactImages(true);
+    return;
+  }
+  bool supported = services_.deviceSupportsContactPictures &&
+                   services_.deviceSupportsContactPictures(_pathToZetoVolume);
+  setShouldSyncContactImages(supported);
+  Log::debug("Sync Contact Images supported: %@", supported ? "YES" : "NO");
+  if (!supported) return;
+  std::optional<platform::Value> enabled =
+      _syncClient ? _syncClient->setting("SyncContactPicturesEnabled") : std::nullopt;
+  if (enabled) {
+    Log::debug("Sync Contact Images enabled: %@", *enabled);
+    const platform::Number* flag = enabled->asNumber();
+    setShouldSyncContactImages(flag && flag->boolValue());
+  } else {
+    Log::debug("Sync Contact Images enabled: YES (Default)");
+  }
+}
+
+void zetoEventCallback(platform::ZetoRef device, std::int32_t event, void* /*ignored*/,
+                       void* context) {
+  auto* manager = static_cast<ZTSyncManager*>(context);
+  if (!manager->zetoRef() || !(*manager->zetoRef() == device)) return;
+  switch (static_cast<platform::ZetoEvent>(event)) {
+    case platform::ZetoEvent::Attached:
+      Log::debug("Zeto attached");
+      break;
+    case platform::ZetoEvent::Removed:
+      Log::debug("Zeto removed");
+      manager->setZetoIsMounted(false);
+      break;
+    case platform::ZetoEvent::Mounted:
+      Log::debug("Zeto mounted");
+      manager->setZetoIsMounted(true);
+      break;
+    case platform::ZetoEvent::Unmounted:
+      Log::debug("Zeto unmounted");
+      manager->setZetoIsMounted(false);
+      break;
+  }
+}
+
+}  // namespace zt::sync
