@@ -1,0 +1,75 @@
+// Runs on a private session bus: dbus-run-session starts a dbus-daemon for this binary alone,
+// and the real zetosynctool posts its notifications there.
+#include <gtest/gtest.h>
+
+#include <chrono>
+#include <cstdlib>
+#include <string>
+#include <vector>
+
+#include "platform/linux/notification_listener.h"
+#include "platform/value.h"
+#include "sync/synctool_fixture.h"
+
+namespace zt::sync::test_support {
+namespace {
+
+using namespace std::chrono_literals;
+using platform::Array;
+using platform::Dictionary;
+using platform::Value;
+
+Dictionary payload(const std::string& phase, double percent, std::optional<std::int64_t> status,
+                   std::optional<Array> dataClasses = std::nullopt) {
+  Dictionary userInfo;
+  userInfo.set("TesselClientCurrentPhase", phase);
+  if (status) userInfo.set("TesselClientStatus", Value::integer(*status));
+  if (dataClasses) userInfo.set("TesselClientDataClassSyncing", Value(*dataClasses));
+  userInfo.set("TesselClientPercentProgressionPhase", Value::real(percent));
+  return userInfo;
+}
+
+using SyncOnSessionBus = SynctoolTest;
+
+TEST_F(SyncOnSessionBus, AListenerReceivesEveryNotificationOfARun) {
+  ASSERT_NE(std::getenv("DBUS_SESSION_BUS_ADDRESS"), nullptr) << "run under dbus-run-session";
+  auto listener = platform::NotificationListener::connectToSessionBus();
+  ASSERT_NE(listener, nullptr);
+
+  registerClient(kClientID, false, false);
+  useSessionBus();
+  const SynctoolRun run = syncClient(kClientID);
+  EXPECT_EQ(run.exitStatus, 0);
+
+  const std::vector<Dictionary> expected = {
+      payload("TesselClientConnectingPhase", 0, std::nullopt),
+      payload("TesselClientConnectingPhase", 100, std::nullopt, Array{}),
+      payload("TesselClientMinglingPhase", 0, std::nullopt),
+      payload("TesselClientUploadingPhase", 100, std::nullopt),
+      payload("TesselClientDisconnectingPhase", 100, 0),
+  };
+  for (std::size_t i = 0; i < expected.size(); ++i) {
+    SCOPED_TRACE(i);
+    const auto received = listener->next(5s);
+    ASSERT_TRUE(received.has_value());
+    EXPECT_EQ(received->name, "TesselClientSyncNotification");
+    EXPECT_EQ(received->sender, kClientID);
+    EXPECT_EQ(received->userInfo, expected[i]);
+  }
+  EXPECT_FALSE(listener->next(200ms).has_value());
+  // The bus does not replace the notification log.
+  EXPECT_EQ(run.notifications.size(), expected.size());
+
+  // A run that fails is heard to the end too.
+  setPlayers({});
+  syncClient(kClientID);
+  const auto first = listener->next(5s);
+  const auto last = listener->next(5s);
+  ASSERT_TRUE(first && last);
+  EXPECT_EQ(first->userInfo, payload("TesselClientConnectingPhase", 0, std::nullopt));
+  EXPECT_EQ(last->userInfo, payload("TesselClientDisconnectingPhase", 100, 3));
+  EXPECT_FALSE(listener->next(200ms).has_value());
+}
+
+}  // namespace
+}  // namespace zt::sync::test_support

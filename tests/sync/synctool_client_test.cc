@@ -1,0 +1,186 @@
+// The sync client's "LastSyncToolVersion" and the upgrade of filters left by the previous
+// generation of the tool, through the real zetosynctool on a real store.
+#include <gtest/gtest.h>
+
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "filters/zeto_calendar_filter.h"
+#include "filters/zeto_contact_filter.h"
+#include "platform/value.h"
+#include "sync/synctool_fixture.h"
+#include "tessel/opaque_filter.h"
+#include "tessel/schema.h"
+#include "tessel/session.h"
+
+namespace zt::sync::test_support {
+namespace {
+
+using platform::Dictionary;
+using platform::Value;
+
+constexpr std::string_view kVersion = "LastSyncToolVersion";
+const std::string kUpgradeLine = "Upgrading Brask client with filters: ";
+
+// A store with two groups and two calendars, and a client whose filters select one of each
+// by identifier string, as the previous generation of the tool stored them, next to a
+// filter of a class this tool does not know.
+class ClientUpgrade : public SynctoolTest {
+ protected:
+  void SetUp() override {
+    SynctoolTest::SetUp();
+    const std::string entity(tessel::TesselRecordEntityNameKey);
+    store().putRecords({
+        {"g1", Dictionary{{entity, Value(tessel::TesselEntity_Contacts_Group)}, {"name", "A"}}},
+        {"g2", Dictionary{{entity, Value(tessel::TesselEntity_Contacts_Group)}, {"name", "B"}}},
+        {"c1", Dictionary{{entity, Value(tessel::TesselEntity_Calendars_Calendar)}}},
+        {"c2", Dictionary{{entity, Value(tessel::TesselEntity_Calendars_Calendar)}}},
+    });
+    auto contacts = std::make_shared<filters::ZetoContactFilter>();
+    contacts->setUseAllContacts(false);
+    contacts->setUsedContactGroups({std::string("g2")});
+    auto calendars = std::make_shared<filters::ZetoCalendarFilter>();
+    calendars->setUseAllCalendars(false);
+    calendars->setUsedCalendarGroups({std::string("c1"), std::string("c2")});
+    auto foreign =
+        std::make_shared<tessel::OpaqueFilter>("ForeignFilter", platform::Data{1, 2, 3, 250});
+    registerClient(kClientID, false, false)->setFilters({contacts, calendars, foreign});
+  }
+
+  void setVersion(std::int64_t version) {
+    client(kClientID)->setSetting(kVersion, Value::integer(version));
+  }
+
+  std::optional<std::int64_t> version() {
+    const auto value = client(kClientID)->setting(kVersion);
+    if (!value) return std::nullopt;
+    EXPECT_NE(value->asNumber(), nullptr) << value->description();
+    return value->asNumber() ? std::optional(value->asNumber()->int64Value()) : std::nullopt;
+  }
+
+  tessel::RecordReference ref(const std::string& identifier) {
+    auto snapshot = store().snapshotOfRecordsInTruth({}, *client(kClientID));
+    return *snapshot->recordReferenceForRecordIdentifier(identifier);
+  }
+
+  // The filters as stored, which must still be the ones set up.
+  void expectFiltersAsSetUp() {
+    const tessel::FilterList filters = client(kClientID)->filters();
+    ASSERT_EQ(filters.size(), 3u);
+    auto* contacts = dynamic_cast<filters::ZetoContactFilter*>(filters[0].get());
+    auto* calendars = dynamic_cast<filters::ZetoCalendarFilter*>(filters[1].get());
+    ASSERT_TRUE(contacts && calendars);
+    EXPECT_EQ(contacts->usedContactGroups(), tessel::CodedElements{std::string("g2")});
+    EXPECT_EQ(calendars->usedCalendarGroups(),
+              (tessel::CodedElements{std::string("c1"), std::string("c2")}));
+  }
+};
+
+TEST_F(ClientUpgrade, AClientOfThePreviousToolGetsItsFiltersRebuiltAgainstTruth) {
+  setVersion(37);
+  setDebugLog(false);
+  const SynctoolRun run = syncClient(kClientID);
+  EXPECT_EQ(run.finalStatus(), 0);
+
+  const tessel::FilterList filters = client(kClientID)->filters();
+  ASSERT_EQ(filters.size(), 3u);
+  auto* contacts = dynamic_cast<filters::ZetoContactFilter*>(filters[0].get());
+  auto* calendars = dynamic_cast<filters::ZetoCalendarFilter*>(filters[1].get());
+  auto* foreign = dynamic_cast<tessel::OpaqueFilter*>(filters[2].get());
+  ASSERT_TRUE(contacts && calendars && foreign);
+  // The identifier strings became references to the same records, in the same order.
+  EXPECT_FALSE(contacts->useAllContacts());
+  EXPECT_EQ(contacts->usedContactGroups(), tessel::CodedElements{ref("g2")});
+  EXPECT_FALSE(calendars->useAllCalendars());
+  EXPECT_EQ(calendars->usedCalendarGroups(), (tessel::CodedElements{ref("c1"), ref("c2")}));
+  // The filter of another class is kept byte for byte.
+  EXPECT_EQ(foreign->className(), "ForeignFilter");
+  EXPECT_EQ(foreign->payload(), (platform::Data{1, 2, 3, 250}));
+
+  // The upgrade line is written with debug logging off, and it is the only line.
+  ASSERT_EQ(run.logLines.size(), 1u) << run.log;
+  const std::string& line = run.logLines[0];
+  EXPECT_EQ(line.rfind(kUpgradeLine + "(Contact Filter 0x", 0), 0u) << line;
+  EXPECT_NE(line.find("enableALL NO, with options (" + ref("g2").text() + ")"), std::string::npos)
+      << line;
+  EXPECT_NE(line.find(", Calendar Filter 0x"), std::string::npos) << line;
+  EXPECT_NE(line.find("with options (" + ref("c1").text() + ", " + ref("c2").text() + ")"),
+            std::string::npos)
+      << line;
+
+  EXPECT_EQ(version(), 38);
+}
+
+TEST_F(ClientUpgrade, EveryFilterChoosingAllIsRebuiltAsChoosingAll) {
+  setVersion(12);
+  client(kClientID)->setFilters({std::make_shared<filters::ZetoContactFilter>(),
+                                 std::make_shared<filters::ZetoCalendarFilter>()});
+  const SynctoolRun run = syncClient(kClientID);
+  EXPECT_EQ(run.finalStatus(), 0);
+  EXPECT_TRUE(run.logged("Last tool used to sync this zeto was on Brask. Upgrade is needed"))
+      << run.log;
+  const tessel::FilterList filters = client(kClientID)->filters();
+  ASSERT_EQ(filters.size(), 2u);
+  EXPECT_TRUE(filters[0]->isEqual(filters::ZetoContactFilter()));
+  EXPECT_TRUE(filters[1]->isEqual(filters::ZetoCalendarFilter()));
+  EXPECT_TRUE(run.logContains(kUpgradeLine));
+  EXPECT_EQ(version(), 38);
+}
+
+TEST_F(ClientUpgrade, WithoutAVersionNothingIsUpgradedAndTheFinishedSyncWritesIt) {
+  const SynctoolRun run = syncClient(kClientID);
+  EXPECT_EQ(run.finalStatus(), 0);
+  EXPECT_TRUE(run.logged("Last tool used to sync this zeto was a old one. No need to upgrade"))
+      << run.log;
+  EXPECT_TRUE(run.logged("Last tool used to sync this zeto was a old one"));
+  EXPECT_FALSE(run.logContains(kUpgradeLine));
+  expectFiltersAsSetUp();
+  EXPECT_EQ(version(), 38);
+}
+
+TEST_F(ClientUpgrade, ThisToolsVersionIsLeftAsItIs) {
+  setVersion(38);
+  const SynctoolRun run = syncClient(kClientID);
+  EXPECT_EQ(run.finalStatus(), 0);
+  EXPECT_TRUE(run.logged("Last tool used to sync this zeto was already this one")) << run.log;
+  EXPECT_FALSE(run.logContains("Brask"));
+  expectFiltersAsSetUp();
+  EXPECT_EQ(version(), 38);
+}
+
+TEST_F(ClientUpgrade, ANewerVersionIsNotUpgradedButOverwritten) {
+  setVersion(39);
+  const SynctoolRun run = syncClient(kClientID);
+  EXPECT_EQ(run.finalStatus(), 0);
+  EXPECT_TRUE(run.logged("Last tool used to sync this zeto was different")) << run.log;
+  EXPECT_FALSE(run.logContains("Brask"));
+  expectFiltersAsSetUp();
+  EXPECT_EQ(version(), 38);
+}
+
+TEST_F(ClientUpgrade, ARunThatDoesNotFinishItsSessionNeverWritesTheVersion) {
+  // No player: the run stops before any session.
+  setPlayers({});
+  EXPECT_EQ(syncClient(kClientID).finalStatus(), 3);
+  EXPECT_EQ(version(), std::nullopt);
+
+  // The upgrade itself happens before the player is looked for; the version still waits for
+  // a finished session.
+  setVersion(37);
+  const SynctoolRun upgraded = syncClient(kClientID);
+  EXPECT_EQ(upgraded.finalStatus(), 3);
+  EXPECT_TRUE(upgraded.logContains(kUpgradeLine));
+  EXPECT_EQ(version(), 37);
+
+  // A session that cannot begin (this process runs one for the client) fails the run.
+  setPlayers({Player(std::string(kPlayerID))});
+  setVersion(39);
+  auto running = tessel::Session::begin(*client(kClientID), {});
+  EXPECT_EQ(syncClient(kClientID).finalStatus(), 2);
+  EXPECT_EQ(version(), 39);
+  running->cancelSyncing();
+}
+
+}  // namespace
+}  // namespace zt::sync::test_support

@@ -1,0 +1,171 @@
+// Finding the player, its lock, waiting for its volume and the folders on it, through the real
+// zetosynctool on virtual players.
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <fstream>
+#include <string>
+
+#include "platform/device_library.h"
+#include "sync/synctool_fixture.h"
+
+namespace zt::sync::test_support {
+namespace {
+
+constexpr std::uint64_t kPlayerNumber = 0xA27001A2B3C4DULL;
+
+std::string readFile(const fs::path& path) {
+  std::ifstream in(path, std::ios::binary);
+  return std::string(std::istreambuf_iterator<char>(in), {});
+}
+
+using PlayerVolume = SynctoolTest;
+
+TEST_F(PlayerVolume, AVolumeMountingLateIsAwaitedAndThenSynced) {
+  registerClient(kClientID, false, false);
+  setPlayers({Player::mountingAfter(std::string(kPlayerID), 1.5)});
+  const SynctoolRun run = syncClient(kClientID);
+  EXPECT_EQ(run.exitStatus, 0);
+  EXPECT_EQ(run.finalStatus(), 0) << run.log;
+  // The player turns up and mounts while the tool waits, in that order.
+  const auto needing = run.lineIndex("Needing to mount Zeto");
+  const auto attached = run.lineIndex("Zeto attached");
+  const auto mounted = run.lineIndex("Zeto mounted");
+  ASSERT_TRUE(needing && attached && mounted) << run.log;
+  EXPECT_LT(*needing, *attached);
+  EXPECT_LT(*attached, *mounted);
+  EXPECT_FALSE(run.logged("Time outing mounting Zeto"));
+  EXPECT_GE(run.seconds, 1.5);
+  EXPECT_TRUE(fs::is_directory(volume() / "Contacts"));
+  EXPECT_TRUE(fs::is_directory(volume() / "Calendars"));
+  EXPECT_EQ(run.notifications.size(), 5u);
+}
+
+TEST_F(PlayerVolume, EventsOfAnotherPlayerDoNotEndTheWait) {
+  registerClient(kClientID, false, false);
+  const fs::path other = folder() / "other";
+  fs::create_directories(other);
+  Player early = Player::mountingAfter("BEEF", 0.2);
+  early.volume = other;
+  setPlayers({early, Player::mountingAfter(std::string(kPlayerID), 1.0)});
+  const SynctoolRun run = syncClient(kClientID);
+  EXPECT_EQ(run.finalStatus(), 0) << run.log;
+  // Only this player's own arrival is noted, and its own volume is used.
+  EXPECT_EQ(std::count(run.logLines.begin(), run.logLines.end(), "Zeto attached"), 1);
+  EXPECT_EQ(std::count(run.logLines.begin(), run.logLines.end(), "Zeto mounted"), 1);
+  EXPECT_FALSE(run.logged("Can't get Zeto mount point"));
+  EXPECT_TRUE(fs::is_directory(volume() / "Contacts"));
+  EXPECT_FALSE(fs::exists(other / "Contacts"));
+}
+
+TEST_F(PlayerVolume, AVolumeThatNeverMountsIsGivenUpAfterTwentySeconds) {
+  registerClient(kClientID, false, false);
+  setPlayers({Player::neverMounting(std::string(kPlayerID))});
+  const SynctoolRun run = syncClient(kClientID);
+  EXPECT_EQ(run.exitStatus, 0);
+  EXPECT_TRUE(run.logged("Needing to mount Zeto")) << run.log;
+  EXPECT_TRUE(run.logged("Time outing mounting Zeto")) << run.log;
+  EXPECT_GE(run.seconds, 20.0);
+  ASSERT_EQ(run.notifications.size(), 2u);
+  EXPECT_EQ(run.finalStatus(), 3);
+  EXPECT_FALSE(client(kClientID)->lastSession().has_value());
+  EXPECT_FALSE(fs::exists(volume() / "Contacts"));
+  // The lock taken before the wait is given back.
+  EXPECT_TRUE(run.logged("Unlocking Zeto"));
+}
+
+TEST_F(PlayerVolume, ARegularFileNamedContactsTurnsContactsOffButNotTheRun) {
+  registerClient(kClientID, true, true);
+  std::ofstream(volume() / "Contacts") << "not a folder";
+  const SynctoolRun run = syncClient(kClientID);
+  EXPECT_EQ(run.exitStatus, 0);
+  EXPECT_TRUE(run.logged("Folder Contacts on Zeto is a regular file, we can't use it to sync"))
+      << run.log;
+  EXPECT_TRUE(fs::is_directory(volume() / "Calendars"));
+  EXPECT_EQ(readFile(volume() / "Contacts"), "not a folder");
+  EXPECT_EQ(run.finalStatus(), 0);
+  // Contacts are off; calendars go on unless this build has no syncer for them.
+  const bool calendarsLeftOut =
+      run.logged("No calendars syncer in this tool, calendars are left out of this sync");
+  EXPECT_EQ(run.dataClassesSyncing(), calendarsLeftOut
+                                          ? std::vector<std::string>{}
+                                          : std::vector<std::string>{"tessel.calendars"});
+  EXPECT_FALSE(run.logged("Sync'ing Contacts"));
+  EXPECT_EQ(run.logged("Sync'ing Calendars"), !calendarsLeftOut);
+  EXPECT_EQ(client(kClientID)->lastSession()->outcome, tessel::SessionOutcome::Finished);
+
+  // Existing folders are used as they are.
+  fs::remove(volume() / "Contacts");
+  fs::create_directory(volume() / "Contacts");
+  const SynctoolRun again = syncClient(kClientID);
+  EXPECT_EQ(again.finalStatus(), 0);
+  EXPECT_FALSE(again.logContains("Need to create")) << again.log;
+  EXPECT_FALSE(again.logContains("regular file"));
+}
+
+using PlayerLock = SynctoolTest;
+
+TEST_F(PlayerLock, APlayerLockedByAnotherProcessIsNotSynced) {
+  registerClient(kClientID, false, false);
+  {
+    LockHolder holder(environment(), kPlayerNumber);
+    ASSERT_EQ(holder.result(), platform::kZetoSuccess);
+    const SynctoolRun run = syncClient(kClientID);
+    EXPECT_EQ(run.exitStatus, 0);
+    EXPECT_TRUE(run.logged("Locking Zeto")) << run.log;
+    EXPECT_TRUE(run.logged("Can't get a lock on Zeto")) << run.log;
+    ASSERT_EQ(run.notifications.size(), 2u);
+    EXPECT_EQ(run.finalStatus(), 3);
+    EXPECT_FALSE(client(kClientID)->lastSession().has_value());
+    EXPECT_FALSE(fs::exists(volume() / "Contacts"));
+    // A lock it never took is not given back.
+    EXPECT_FALSE(run.logged("Unlocking Zeto"));
+  }
+  // Once the other process lets go, the player syncs.
+  const SynctoolRun run = syncClient(kClientID);
+  EXPECT_EQ(run.finalStatus(), 0) << run.log;
+  EXPECT_TRUE(run.logged("Unlocking Zeto"));
+
+  // And a sync that ended has left the lock free for the next user.
+  LockHolder next(environment(), kPlayerNumber);
+  EXPECT_EQ(next.result(), platform::kZetoSuccess);
+}
+
+using PlayerMatching = SynctoolTest;
+
+TEST_F(PlayerMatching, TheClientIdentifierMustEndWithTheUpperCaseHexIdentifier) {
+  // The file's identifiers are read as numbers: leading zeros and lower case do not matter,
+  // the tool compares the "%llX" text, 1A2B here.
+  setPlayers({Player("00001a2b")});
+  registerClient("XYZ01A2B", false, false);
+  registerClient("XYZ01a2b", false, false);
+  registerClient("1A2BXYZ", false, false);
+
+  const SynctoolRun match = syncClient("XYZ01A2B");
+  EXPECT_EQ(match.finalStatus(), 0) << match.log;
+  EXPECT_TRUE(match.logged("Zeto is connected"));
+  EXPECT_TRUE(client("XYZ01A2B")->lastSession().has_value());
+
+  for (const char* clientID : {"XYZ01a2b", "1A2BXYZ"}) {
+    SCOPED_TRACE(clientID);
+    const SynctoolRun miss = syncClient(clientID);
+    EXPECT_EQ(miss.finalStatus(), 3);
+    EXPECT_TRUE(miss.logged("Can't find Zeto")) << miss.log;
+    EXPECT_FALSE(client(clientID)->lastSession().has_value());
+  }
+}
+
+TEST_F(PlayerMatching, TheFirstMatchingPlayerInTheListIsSynced) {
+  const fs::path other = folder() / "other";
+  fs::create_directories(other);
+  // "2B" and "1A2B" both end the client identifier; the one listed first wins.
+  setPlayers({Player("FF"), Player("02B", other), Player("1A2B")});
+  registerClient("XYZ01A2B", false, false);
+  const SynctoolRun run = syncClient("XYZ01A2B");
+  EXPECT_EQ(run.finalStatus(), 0) << run.log;
+  EXPECT_TRUE(fs::is_directory(other / "Contacts"));
+  EXPECT_FALSE(fs::exists(volume() / "Contacts"));
+}
+
+}  // namespace
+}  // namespace zt::sync::test_support

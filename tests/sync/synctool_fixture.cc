@@ -1,0 +1,319 @@
+#include "sync/synctool_fixture.h"
+
+#include <fcntl.h>
+#include <signal.h>
+#include <stdlib.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <chrono>
+#include <fstream>
+#include <sstream>
+#include <system_error>
+#include <thread>
+
+#include "filters/filter_classes.h"
+#include "platform/device_library.h"
+#include "sync/zt_sync_manager.h"
+
+namespace zt::sync::test_support {
+
+namespace {
+
+// A run that takes longer than this is stuck; it is killed and the test fails.
+constexpr auto kRunDeadline = std::chrono::seconds(50);
+
+std::string readFile(const fs::path& path) {
+  std::ifstream in(path, std::ios::binary);
+  std::ostringstream text;
+  text << in.rdbuf();
+  return text.str();
+}
+
+void writeFile(const fs::path& path, const std::string& text) {
+  std::ofstream out(path, std::ios::binary | std::ios::trunc);
+  out << text;
+}
+
+std::vector<std::string> splitLines(const std::string& text) {
+  std::vector<std::string> lines;
+  std::istringstream in(text);
+  for (std::string line; std::getline(in, line);) lines.push_back(line);
+  return lines;
+}
+
+}  // namespace
+
+bool SynctoolRun::logged(std::string_view line) const {
+  return lineIndex(line).has_value();
+}
+
+bool SynctoolRun::logContains(std::string_view text) const {
+  return log.find(text) != std::string::npos;
+}
+
+std::optional<std::size_t> SynctoolRun::lineIndex(std::string_view line) const {
+  auto found = std::find(logLines.begin(), logLines.end(), line);
+  if (found == logLines.end()) return std::nullopt;
+  return static_cast<std::size_t>(found - logLines.begin());
+}
+
+std::optional<std::int64_t> SynctoolRun::finalStatus() const {
+  if (notifications.empty()) return std::nullopt;
+  const Json& userInfo = notifications.back()["userInfo"];
+  if (!userInfo.contains("TesselClientStatus")) return std::nullopt;
+  return userInfo["TesselClientStatus"].get<std::int64_t>();
+}
+
+std::optional<std::vector<std::string>> SynctoolRun::dataClassesSyncing() const {
+  for (const Json& note : notifications) {
+    const Json& userInfo = note["userInfo"];
+    if (userInfo.contains("TesselClientDataClassSyncing")) {
+      return userInfo["TesselClientDataClassSyncing"].get<std::vector<std::string>>();
+    }
+  }
+  return std::nullopt;
+}
+
+Json expectedNotification(std::string_view sender, std::string_view phase, double percent,
+                          std::optional<std::int64_t> status,
+                          std::optional<std::vector<std::string>> dataClasses) {
+  Json userInfo = Json::object();
+  userInfo["TesselClientCurrentPhase"] = std::string(phase);
+  if (status) userInfo["TesselClientStatus"] = *status;
+  if (dataClasses) userInfo["TesselClientDataClassSyncing"] = Json(*dataClasses);
+  userInfo["TesselClientPercentProgressionPhase"] = percent;
+  Json line = Json::object();
+  line["name"] = "TesselClientSyncNotification";
+  line["object"] = std::string(sender);
+  line["userInfo"] = std::move(userInfo);
+  return line;
+}
+
+void SynctoolTest::SetUp() {
+  std::string pattern = (fs::temp_directory_path() / "zt-synctool-XXXXXX").string();
+  ASSERT_NE(::mkdtemp(pattern.data()), nullptr);
+  folder_ = pattern;
+  fs::create_directories(volume());
+  fs::create_directories(folder_ / "run");
+  // The test reads the filters the tool wrote back as the tool's own classes.
+  filters::registerFilterClasses();
+  store_ = tessel::Store::open(folder_ / "truth.db");
+  setPlayers({Player(std::string(kPlayerID))});
+  setDebugLog(true);
+}
+
+void SynctoolTest::TearDown() {
+  store_.reset();
+  std::error_code ignored;
+  for (const auto& entry : fs::recursive_directory_iterator(folder_, ignored)) {
+    if (entry.is_directory(ignored)) {
+      fs::permissions(entry.path(), fs::perms::owner_all, fs::perm_options::add, ignored);
+    }
+  }
+  fs::remove_all(folder_, ignored);
+}
+
+std::unique_ptr<tessel::Client> SynctoolTest::registerClient(std::string_view identifier,
+                                                             bool contacts, bool calendars) {
+  std::vector<std::string> entities;
+  if (contacts) {
+    const auto& names = ZTSyncManager::entitiesForContacts();
+    entities.insert(entities.end(), names.begin(), names.end());
+  }
+  if (calendars) {
+    const auto& names = ZTSyncManager::entitiesForCalendars();
+    entities.insert(entities.end(), names.begin(), names.end());
+  }
+  return store_->registerClient(identifier, "Zeto", entities);
+}
+
+std::unique_ptr<tessel::Client> SynctoolTest::client(std::string_view identifier) const {
+  return store_->clientWithIdentifier(identifier);
+}
+
+void SynctoolTest::setPlayers(const std::vector<Player>& players) {
+  Json list = Json::array();
+  for (const Player& player : players) {
+    Json entry = Json::object();
+    entry["id"] = player.id;
+    entry["volume"] = (player.volume.empty() ? volume() : player.volume).string();
+    entry["mounted"] = player.mounted;
+    if (player.mountAfter) entry["mount_after"] = *player.mountAfter;
+    if (player.checkpoint) entry["checkpoint"] = player.checkpoint->string();
+    list.push_back(std::move(entry));
+  }
+  setDevicesFile(list.dump(2));
+}
+
+void SynctoolTest::setDevicesFile(const std::string& json) {
+  writeFile(folder_ / "devices.json", json);
+}
+
+void SynctoolTest::setDefaults(const std::string& text) {
+  writeFile(folder_ / "defaults.conf", text);
+}
+
+void SynctoolTest::setDebugLog(bool on) {
+  setDefaults(std::string("DebugLog = ") + (on ? "true" : "false") + "\n");
+}
+
+std::map<std::string, std::string> SynctoolTest::environment() const {
+  std::map<std::string, std::string> env = {
+      {"HOME", folder_.string()},
+      {"XDG_RUNTIME_DIR", (folder_ / "run").string()},
+      {"XDG_CONFIG_HOME", (folder_ / "config").string()},
+      {"XDG_DATA_HOME", (folder_ / "data").string()},
+      {"TESSEL_STORE", (folder_ / "truth.db").string()},
+      {"ZETO_VIRTUAL_DEVICES", (folder_ / "devices.json").string()},
+      {"ZETOSYNCTOOL_DEFAULTS", (folder_ / "defaults.conf").string()},
+      {"ZETOSYNCTOOL_LOG", (folder_ / "log.txt").string()},
+      {"TESSEL_NOTIFICATIONS_LOG", (folder_ / "notes.jsonl").string()},
+  };
+  if (useSessionBus_) {
+    if (const char* bus = std::getenv("DBUS_SESSION_BUS_ADDRESS")) {
+      env["DBUS_SESSION_BUS_ADDRESS"] = bus;
+    }
+  }
+  for (const auto& [name, value] : overrides_) env[name] = value;
+  return env;
+}
+
+SynctoolRun SynctoolTest::runSynctool(const std::vector<std::string>& arguments) {
+  const fs::path logPath = folder_ / "log.txt";
+  const fs::path notesPath = folder_ / "notes.jsonl";
+  const fs::path errPath = folder_ / "stderr.txt";
+  std::error_code ignored;
+  fs::remove(logPath, ignored);
+  fs::remove(notesPath, ignored);
+
+  // Everything the child needs is made before the fork.
+  std::vector<std::string> args = {ZETOSYNCTOOL_BINARY};
+  args.insert(args.end(), arguments.begin(), arguments.end());
+  std::vector<char*> argv;
+  for (std::string& arg : args) argv.push_back(arg.data());
+  argv.push_back(nullptr);
+  std::vector<std::string> env;
+  for (const auto& [name, value] : environment()) env.push_back(name + "=" + value);
+  std::vector<char*> envp;
+  for (std::string& entry : env) envp.push_back(entry.data());
+  envp.push_back(nullptr);
+  const std::string errFile = errPath.string();
+
+  SynctoolRun run;
+  const auto start = std::chrono::steady_clock::now();
+  const pid_t pid = ::fork();
+  if (pid < 0) {
+    ADD_FAILURE() << "fork failed";
+    return run;
+  }
+  if (pid == 0) {
+    const int in = ::open("/dev/null", O_RDONLY);
+    const int err = ::open(errFile.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
+    if (in >= 0) ::dup2(in, STDIN_FILENO);
+    if (err >= 0) {
+      ::dup2(err, STDOUT_FILENO);
+      ::dup2(err, STDERR_FILENO);
+    }
+    ::execve(argv[0], argv.data(), envp.data());
+    ::_exit(127);
+  }
+
+  int status = 0;
+  for (;;) {
+    const pid_t done = ::waitpid(pid, &status, WNOHANG);
+    if (done == pid) break;
+    if (done < 0 && errno != EINTR) {
+      ADD_FAILURE() << "waitpid failed";
+      return run;
+    }
+    if (std::chrono::steady_clock::now() - start > kRunDeadline) {
+      ::kill(pid, SIGKILL);
+      ::waitpid(pid, &status, 0);
+      ADD_FAILURE() << "zetosynctool did not end in time and was killed";
+      break;
+    }
+    std::this_thread::sleep_for(std::chrono::milliseconds(10));
+  }
+  run.seconds = std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
+  run.exitStatus = WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+  run.log = readFile(logPath);
+  run.logLines = splitLines(run.log);
+  run.standardError = readFile(errPath);
+  for (const std::string& line : splitLines(readFile(notesPath))) {
+    if (line.empty()) continue;
+    Json parsed = Json::parse(line, nullptr, false);
+    if (parsed.is_discarded()) {
+      ADD_FAILURE() << "not a JSON line in the notification log: " << line;
+      continue;
+    }
+    run.notifications.push_back(std::move(parsed));
+  }
+  return run;
+}
+
+LockHolder::LockHolder(const std::map<std::string, std::string>& environment,
+                       std::uint64_t uniqueId) {
+  int answer[2];
+  int release[2];
+  if (::pipe2(answer, O_CLOEXEC) != 0) {
+    ADD_FAILURE() << "pipe failed";
+    return;
+  }
+  if (::pipe2(release, O_CLOEXEC) != 0) {
+    ::close(answer[0]);
+    ::close(answer[1]);
+    ADD_FAILURE() << "pipe failed";
+    return;
+  }
+  pid_ = ::fork();
+  if (pid_ == 0) {
+    ::close(answer[0]);
+    ::close(release[1]);
+    for (const auto& [name, value] : environment) ::setenv(name.c_str(), value.c_str(), 1);
+    std::int32_t result = platform::kZetoErrorNoSuchDevice;
+    std::unique_ptr<platform::DeviceLibrary> library = platform::makeDeviceLibrary();
+    std::vector<platform::ZetoRef> devices;
+    if (library->ZetoCopyConnected(devices) == platform::kZetoSuccess) {
+      for (platform::ZetoRef device : devices) {
+        if (library->ZetoGetUniqueID(device) == uniqueId) {
+          result = library->ZetoAquireLock(device);
+          break;
+        }
+      }
+    }
+    if (::write(answer[1], &result, sizeof result) != sizeof result) ::_exit(1);
+    // Holds the lock until the test closes its end of the pipe (or dies).
+    char byte;
+    while (::read(release[0], &byte, 1) < 0 && errno == EINTR) {
+    }
+    ::_exit(0);
+  }
+  ::close(answer[1]);
+  ::close(release[0]);
+  release_ = release[1];
+  if (pid_ < 0) {
+    ADD_FAILURE() << "fork failed";
+    ::close(answer[0]);
+    return;
+  }
+  std::int32_t result = 0;
+  ssize_t got;
+  do {
+    got = ::read(answer[0], &result, sizeof result);
+  } while (got < 0 && errno == EINTR);
+  if (got == sizeof result) result_ = result;
+  ::close(answer[0]);
+}
+
+LockHolder::~LockHolder() {
+  if (release_ >= 0) ::close(release_);
+  if (pid_ > 0) {
+    int status = 0;
+    ::waitpid(pid_, &status, 0);
+  }
+}
+
+}  // namespace zt::sync::test_support
