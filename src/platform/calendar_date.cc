@@ -109,8 +109,7 @@ std::string CalendarDate::description() const {
   std::int32_t a = offset < 0 ? -offset : offset;
   char text[64];
   std::snprintf(text, sizeof text, "%04d-%02d-%02d %02d:%02d:%02d %c%02d%02d", f.year, f.month,
-                f.day, f.hour, f.minute, f.second, offset < 0 ? '-' : '+', a / 3600,
-                a / 60 % 60);
+                f.day, f.hour, f.minute, f.second, offset < 0 ? '-' : '+', a / 3600, a / 60 % 60);
   return text;
 }
 

@@ -18,8 +18,7 @@ class LogArgument {
   template <std::signed_integral T>
   LogArgument(T v) : v_(static_cast<std::int64_t>(v)) {}
   template <std::unsigned_integral T>
-    requires(!std::same_as<T, bool>)
-  LogArgument(T v) : v_(static_cast<std::uint64_t>(v)) {}
+  requires(!std::same_as<T, bool>) LogArgument(T v) : v_(static_cast<std::uint64_t>(v)) {}
   LogArgument(bool v) : v_(static_cast<std::int64_t>(v ? 1 : 0)) {}
   LogArgument(double v) : v_(v) {}
   LogArgument(const char* s) : v_(std::string(s ? s : "(null)")) {}
@@ -27,9 +26,9 @@ class LogArgument {
   LogArgument(const std::string& s) : v_(s) {}
   LogArgument(const void* p) : v_(p) {}
   template <typename T>
-    requires requires(const T& t) {
-      { t.description() } -> std::convertible_to<std::string>;
-    }
+  requires requires(const T& t) {
+    { t.description() } -> std::convertible_to<std::string>;
+  }
   LogArgument(const T& object) : v_(std::string(object.description())) {}
 
   using Storage = std::variant<std::int64_t, std::uint64_t, double, std::string, const void*>;

@@ -177,7 +177,8 @@ Info infoAt(const TimeZone::Impl& impl, std::chrono::sys_seconds instant) {
       return zone ? fromSys(zone->get_info(t)) : Info{};
     }
     case TimeZone::Kind::Unnamed:
-      if (impl.posix && impl.posix->isDaylight(instant, impl.standardOffset, *impl.daylightOffset)) {
+      if (impl.posix &&
+          impl.posix->isDaylight(instant, impl.standardOffset, *impl.daylightOffset)) {
         return Info{*impl.daylightOffset, true};
       }
       return Info{impl.standardOffset, false};
@@ -195,17 +196,20 @@ std::chrono::sys_seconds instantFromLocal(const date::local_info& info,
 }  // namespace
 
 TimeZone TimeZone::gmt() {
-  static const TimeZone zone(std::make_shared<Impl>(Impl{Kind::Named, "GMT", nullptr, 0, std::nullopt, {}, std::nullopt}));
+  static const TimeZone zone(
+      std::make_shared<Impl>(Impl{Kind::Named, "GMT", nullptr, 0, std::nullopt, {}, std::nullopt}));
   return zone;
 }
 
 TimeZone TimeZone::utc() {
-  static const TimeZone zone(std::make_shared<Impl>(Impl{Kind::Named, "UTC", nullptr, 0, std::nullopt, {}, std::nullopt}));
+  static const TimeZone zone(
+      std::make_shared<Impl>(Impl{Kind::Named, "UTC", nullptr, 0, std::nullopt, {}, std::nullopt}));
   return zone;
 }
 
 TimeZone TimeZone::local() {
-  static const TimeZone zone(std::make_shared<Impl>(Impl{Kind::Local, {}, nullptr, 0, std::nullopt, {}, std::nullopt}));
+  static const TimeZone zone(
+      std::make_shared<Impl>(Impl{Kind::Local, {}, nullptr, 0, std::nullopt, {}, std::nullopt}));
   return zone;
 }
 
@@ -247,7 +251,9 @@ std::optional<TimeZone> TimeZone::unnamed(std::int32_t standardOffset,
   return TimeZone(std::move(impl));
 }
 
-TimeZone::Kind TimeZone::kind() const { return impl_->kind; }
+TimeZone::Kind TimeZone::kind() const {
+  return impl_->kind;
+}
 
 std::optional<std::string> TimeZone::name() const {
   switch (impl_->kind) {
@@ -303,8 +309,8 @@ std::chrono::sys_seconds TimeZone::instantAt(std::chrono::local_seconds wallCloc
       // clock was showing daylight time.
       std::chrono::sys_seconds asStandard{wallClock.time_since_epoch() -
                                           std::chrono::seconds{impl_->standardOffset}};
-      if (impl_->posix && impl_->posix->isDaylight(asStandard, impl_->standardOffset,
-                                                  *impl_->daylightOffset)) {
+      if (impl_->posix &&
+          impl_->posix->isDaylight(asStandard, impl_->standardOffset, *impl_->daylightOffset)) {
         return std::chrono::sys_seconds{wallClock.time_since_epoch() -
                                         std::chrono::seconds{*impl_->daylightOffset}};
       }

@@ -23,7 +23,9 @@ double Number::doubleValue() const {
   return kind_ == Kind::Real ? real_ : static_cast<double>(integer_);
 }
 
-bool Number::boolValue() const { return kind_ == Kind::Real ? real_ != 0.0 : integer_ != 0; }
+bool Number::boolValue() const {
+  return kind_ == Kind::Real ? real_ != 0.0 : integer_ != 0;
+}
 
 bool Number::operator==(const Number& other) const {
   if (kind_ != other.kind_) return false;
@@ -80,7 +82,9 @@ bool Dictionary::erase(std::string_view key) {
   return false;
 }
 
-bool Dictionary::operator==(const Dictionary& other) const { return entries_ == other.entries_; }
+bool Dictionary::operator==(const Dictionary& other) const {
+  return entries_ == other.entries_;
+}
 
 namespace {
 

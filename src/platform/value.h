@@ -34,7 +34,8 @@ class Number {
   std::string description() const;
 
  private:
-  Number(Kind kind, std::int64_t integer, double real) : kind_(kind), integer_(integer), real_(real) {}
+  Number(Kind kind, std::int64_t integer, double real)
+      : kind_(kind), integer_(integer), real_(real) {}
   Kind kind_;
   std::int64_t integer_;
   double real_;
@@ -63,16 +64,17 @@ class Dictionary {
 
   const Value* find(std::string_view key) const;
   Value* find(std::string_view key);
-  bool contains(std::string_view key) const { return find(key) != nullptr; }
+  bool contains(std::string_view key) const;
   // Replaces the value of an existing key in place, or appends the key at the end.
   void set(std::string_view key, Value value);
   bool erase(std::string_view key);
 
-  std::size_t size() const { return entries_.size(); }
-  bool empty() const { return entries_.empty(); }
-  const_iterator begin() const { return entries_.begin(); }
-  const_iterator end() const { return entries_.end(); }
-  void reserve(std::size_t n) { entries_.reserve(n); }
+  // Defined after Value, which must be complete first.
+  std::size_t size() const;
+  bool empty() const;
+  const_iterator begin() const;
+  const_iterator end() const;
+  void reserve(std::size_t n);
 
   // Key order is part of a record, so it is part of equality.
   bool operator==(const Dictionary& other) const;
@@ -128,5 +130,24 @@ class Value {
   // The order of the alternatives is the order of Kind.
   std::variant<std::string, Number, CalendarDate, Url, Data, Array, Dictionary> v_;
 };
+
+inline bool Dictionary::contains(std::string_view key) const {
+  return find(key) != nullptr;
+}
+inline std::size_t Dictionary::size() const {
+  return entries_.size();
+}
+inline bool Dictionary::empty() const {
+  return entries_.empty();
+}
+inline Dictionary::const_iterator Dictionary::begin() const {
+  return entries_.begin();
+}
+inline Dictionary::const_iterator Dictionary::end() const {
+  return entries_.end();
+}
+inline void Dictionary::reserve(std::size_t n) {
+  entries_.reserve(n);
+}
 
 }  // namespace zt::platform

@@ -266,7 +266,8 @@ TEST(RecordJsonErrors, JsonLinesNameTheLine) {
       {R"({"id":"a","record":{"tessel.record.entity":"e"}})", "id", "already given on line 1"},
   };
   for (const auto& [bad, path, reason] : cases) {
-    const RecordJsonError e = errorOf([&] { parseRecordLines(good + "\n\n" + bad + "\n" + good); });
+    const std::string lines = good + "\n\n" + bad + "\n" + good;
+    const RecordJsonError e = errorOf([&] { parseRecordLines(lines); });
     EXPECT_EQ(e.line(), 3u) << bad;
     EXPECT_EQ(e.path(), path) << bad;
     EXPECT_NE(e.reason().find(reason), std::string::npos) << bad << ": " << e.what();
