@@ -1,0 +1,70 @@
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <map>
+#include <memory>
+#include <optional>
+#include <set>
+#include <string>
+#include <vector>
+
+#include "platform/scsi_pass_through.h"
+#include "platform/virtual/virtual_players.h"
+
+namespace zt::platform {
+
+// The steps of a conversation with a virtual player that a test can make fail.
+enum class VirtualScsiStep {
+  CreatePlugIn,
+  QueryTaskDevice,
+  ExclusiveAccess,
+  CreateTask,
+  SetCommandDescriptorBlock,
+  SetScatterGatherEntries,
+  SetTimeout,
+};
+
+// SCSI pass-through to the virtual players. The plug-in of player N's nub
+// (VirtualHardwareRegistry) answers INQUIRY for vital product data pages from the player's
+// "checkpoint" document, split into pages of at most 251 bytes: page 0xC0 gives their count
+// and lists their codes 0xC2, 0xC3... in order (a document too long for 62 pages gives a
+// table the probe refuses), and each listed page carries its piece. Without a readable
+// document every INQUIRY fails.
+class VirtualScsiPassThrough final : public ScsiPassThrough {
+ public:
+  // What a test changes to make a player misbehave.
+  struct Faults {
+    std::set<VirtualScsiStep> failingSteps;
+    // INQUIRY for these page codes fails.
+    std::set<std::uint8_t> failingPages;
+    // These pages answer with these payloads instead of the document's (0xC0 included: its
+    // payload is the list of page codes, its length the page count).
+    std::map<std::uint8_t, std::vector<std::uint8_t>> pages;
+  };
+  // What the players were asked.
+  struct Trace {
+    std::vector<std::uint8_t> inquiries;  // page codes, in the order asked
+    int exclusiveAccessHeld = 0;          // obtained and not yet released
+    int openPlugIns = 0;
+  };
+
+  static constexpr std::size_t kPagePayload = 251;
+
+  // None: the device file could not be read, and no plug-in can be made.
+  explicit VirtualScsiPassThrough(std::optional<std::vector<VirtualPlayer>> players);
+
+  std::unique_ptr<ScsiPlugIn> createPlugIn(const RegistryEntry& entry) override;
+
+  Faults& faults() { return faults_; }
+  const Trace& trace() const { return trace_; }
+  // For the player objects this pass-through hands out, which record into it.
+  Trace& mutableTrace() { return trace_; }
+
+ private:
+  std::optional<std::vector<VirtualPlayer>> players_;
+  Faults faults_;
+  Trace trace_;
+};
+
+}  // namespace zt::platform

@@ -1,0 +1,188 @@
+#include "device/checkpoint_data.h"
+
+#include <gtest/gtest.h>
+
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "device/contact_pictures.h"
+#include "device/driver_entry_lookup.h"
+#include "device/probe_test_support.h"
+#include "platform/virtual/virtual_hardware_registry.h"
+#include "platform/virtual/virtual_scsi_pass_through.h"
+
+namespace zt::device {
+namespace {
+
+using platform::VirtualScsiPassThrough;
+using platform::VirtualScsiStep;
+using test_support::bytesOf;
+using test_support::CapturedLog;
+using test_support::checkpointDocument;
+using test_support::textOf;
+using test_support::VirtualPlayerFolder;
+
+constexpr std::size_t kPage = VirtualScsiPassThrough::kPagePayload;
+
+// One virtual player, its registry and pass-through, and the driver entry the probe would
+// have found for it.
+class CheckpointTest : public ::testing::Test {
+ protected:
+  void usePlayer(std::optional<std::string> document) {
+    player_.emplace(std::move(document));
+    registry_.emplace(player_->players());
+    passThrough_.emplace(player_->players());
+    std::optional<platform::RegistryEntry> driver;
+    ASSERT_TRUE(findDriverEntry("/dev/zetovirt0", driver));
+    driver_ = std::move(driver);
+  }
+
+  bool findDriverEntry(std::string_view path, std::optional<platform::RegistryEntry>& driver);
+
+  std::optional<CheckpointData> read() { return readCheckpointData(*passThrough_, *driver_); }
+  VirtualScsiPassThrough& passThrough() { return *passThrough_; }
+  const std::vector<std::uint8_t>& inquiries() { return passThrough_->trace().inquiries; }
+
+  CapturedLog log_;
+
+ private:
+  std::optional<VirtualPlayerFolder> player_;
+  std::optional<platform::VirtualHardwareRegistry> registry_;
+  std::optional<VirtualScsiPassThrough> passThrough_;
+  std::optional<platform::RegistryEntry> driver_;
+};
+
+bool CheckpointTest::findDriverEntry(std::string_view path,
+                                     std::optional<platform::RegistryEntry>& driver) {
+  return device::findDriverEntry(*registry_, path, kZetoDriverClassNames, &driver);
+}
+
+TEST_F(CheckpointTest, SixtyTwoPagesAreTheMostThatAreRead) {
+  const std::string document = checkpointDocument("<true/>", 62 * kPage);
+  ASSERT_EQ(document.size(), 62 * kPage);
+  usePlayer(document);
+  auto data = read();
+  ASSERT_TRUE(data);
+  EXPECT_EQ(textOf(*data), document);
+  EXPECT_EQ(inquiries().size(), 63u);
+  EXPECT_TRUE(log_.has("Checkpoint data is 15562l bytes long"));
+  EXPECT_TRUE(checkpointSupportsContactPictures(*data));
+
+  // One byte more needs a 63rd page: the table is refused and no page is asked for.
+  usePlayer(checkpointDocument("<true/>", 62 * kPage + 1));
+  EXPECT_FALSE(read());
+  EXPECT_TRUE(log_.has("Invalid Checkpoint page count"));
+  EXPECT_EQ(inquiries(), std::vector<std::uint8_t>{0xC0});
+}
+
+TEST_F(CheckpointTest, TableIsCheckedWholeBeforeAnyPageIsRead) {
+  usePlayer(checkpointDocument("<true/>", 3 * kPage));
+  passThrough().faults().pages[0xC0] = {0xC2, 0xC3, 0xC1};
+  EXPECT_FALSE(read());
+  EXPECT_TRUE(log_.has("Invalid Checkpoint page index #2l"));
+  EXPECT_EQ(inquiries(), std::vector<std::uint8_t>{0xC0});
+
+  usePlayer(checkpointDocument("<true/>", 3 * kPage));
+  passThrough().faults().pages[0xC0] = {0x00, 0xC2};
+  EXPECT_FALSE(read());
+  EXPECT_TRUE(log_.has("Invalid Checkpoint page index #0l"));
+
+  // 0xC2 is the lowest page the table may list.
+  usePlayer(checkpointDocument("<true/>", 2 * kPage));
+  passThrough().faults().pages[0xC0] = {0xC3, 0xC2};
+  auto data = read();
+  ASSERT_TRUE(data);
+  EXPECT_EQ(inquiries(), (std::vector<std::uint8_t>{0xC0, 0xC3, 0xC2}));
+  const std::string document = checkpointDocument("<true/>", 2 * kPage);
+  EXPECT_EQ(textOf(*data), document.substr(kPage) + document.substr(0, kPage));
+}
+
+TEST_F(CheckpointTest, EmptyOrFailingTableGivesNothing) {
+  usePlayer(checkpointDocument("<true/>"));
+  passThrough().faults().pages[0xC0] = {};
+  EXPECT_FALSE(read());
+  EXPECT_TRUE(log_.has("0 entry in TOC"));
+
+  usePlayer(checkpointDocument("<true/>"));
+  passThrough().faults().failingPages = {0xC0};
+  EXPECT_FALSE(read());
+  EXPECT_TRUE(log_.has("Error in ExecuteTaskSync"));
+  EXPECT_TRUE(log_.has("Error getting first checkpoint"));
+
+  // A player without a self-description answers no INQUIRY at all.
+  usePlayer(std::nullopt);
+  EXPECT_FALSE(read());
+  EXPECT_EQ(inquiries(), std::vector<std::uint8_t>{0xC0});
+
+  // Pages that all come back empty make no document.
+  usePlayer(checkpointDocument("<true/>"));
+  passThrough().faults().pages[0xC0] = {0xC2};
+  passThrough().faults().pages[0xC2] = {};
+  EXPECT_FALSE(read());
+  EXPECT_EQ(inquiries(), (std::vector<std::uint8_t>{0xC0, 0xC2}));
+  EXPECT_FALSE(log_.has("Checkpoint data is 0l bytes long"));
+}
+
+TEST_F(CheckpointTest, FailedMiddlePageLeavesGapFailedLastPageLosesAll) {
+  const std::string document = checkpointDocument("<true/>", 3 * kPage);
+  usePlayer(document);
+  passThrough().faults().failingPages = {0xC3};
+  auto data = read();
+  ASSERT_TRUE(data);
+  EXPECT_EQ(textOf(*data), document.substr(0, kPage) + document.substr(2 * kPage));
+  EXPECT_EQ(inquiries(), (std::vector<std::uint8_t>{0xC0, 0xC2, 0xC3, 0xC4}));
+
+  usePlayer(document);
+  passThrough().faults().failingPages = {0xC4};
+  EXPECT_FALSE(read());
+  EXPECT_EQ(inquiries().size(), 4u);
+}
+
+TEST_F(CheckpointTest, PayloadEndsWithTheTransfer) {
+  // A page whose length byte claims more than a 255-byte transfer can carry: only what
+  // arrived is kept.
+  usePlayer(checkpointDocument("<true/>"));
+  passThrough().faults().pages[0xC0] = {0xC2};
+  passThrough().faults().pages[0xC2] = std::vector<std::uint8_t>(255, 'a');
+  auto data = read();
+  ASSERT_TRUE(data);
+  EXPECT_EQ(data->size(), 251u);
+}
+
+TEST_F(CheckpointTest, EntityTheParserRejectsIsOverwritten) {
+  const std::string document = checkpointDocument("<true/>");
+  std::string withEntities = document;
+  withEntities.replace(withEntities.find("Zeto 4"), 6, "Z&xff;eto&xff;4");
+  usePlayer(withEntities);
+  auto data = read();
+  ASSERT_TRUE(data);
+  EXPECT_EQ(data->size(), withEntities.size());
+  EXPECT_NE(textOf(*data).find("<string>Z00000eto000004</string>"), std::string::npos);
+  EXPECT_TRUE(checkpointSupportsContactPictures(*data));
+
+  // The search stops at a NUL byte.
+  CheckpointData bytes = bytesOf(std::string("&xff;&xff\0&xff;", 15));
+  replaceUnparsableEntities(bytes);
+  EXPECT_EQ(textOf(bytes), std::string("00000&xff\0&xff;", 15));
+}
+
+TEST_F(CheckpointTest, ResourcesAreGivenBackWhateverHappens) {
+  for (VirtualScsiStep step : {VirtualScsiStep::CreatePlugIn, VirtualScsiStep::QueryTaskDevice,
+                               VirtualScsiStep::ExclusiveAccess, VirtualScsiStep::CreateTask}) {
+    SCOPED_TRACE(static_cast<int>(step));
+    usePlayer(checkpointDocument("<true/>"));
+    passThrough().faults().failingSteps = {step};
+    EXPECT_FALSE(read());
+    EXPECT_EQ(passThrough().trace().exclusiveAccessHeld, 0);
+    EXPECT_EQ(passThrough().trace().openPlugIns, 0);
+  }
+  usePlayer(checkpointDocument("<true/>", 3 * kPage));
+  passThrough().faults().failingPages = {0xC3};
+  EXPECT_TRUE(read());
+  EXPECT_EQ(passThrough().trace().exclusiveAccessHeld, 0);
+  EXPECT_EQ(passThrough().trace().openPlugIns, 0);
+}
+
+}  // namespace
+}  // namespace zt::device

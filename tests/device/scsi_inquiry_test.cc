@@ -1,0 +1,170 @@
+#include "device/scsi_inquiry.h"
+
+#include <gtest/gtest.h>
+
+#include <chrono>
+#include <memory>
+#include <optional>
+#include <vector>
+
+#include "device/checkpoint_data.h"
+#include "device/probe_test_support.h"
+#include "device/sense_data.h"
+#include "platform/linux/linux_scsi_pass_through.h"
+#include "platform/virtual/virtual_hardware_registry.h"
+#include "platform/virtual/virtual_scsi_pass_through.h"
+
+namespace zt::device {
+namespace {
+
+using test_support::CapturedLog;
+
+// Records what a task was set up with, and answers with a fixed page.
+struct Recorded {
+  std::vector<std::uint8_t> cdb;
+  std::size_t entries = 0;
+  std::size_t entrySize = 0;
+  std::uint64_t transferCount = 0;
+  platform::TransferDirection direction = platform::TransferDirection::None;
+  std::chrono::milliseconds timeout{0};
+};
+
+class RecordingTask final : public platform::ScsiTask {
+ public:
+  explicit RecordingTask(Recorded& recorded) : recorded_(recorded) {}
+  bool setCommandDescriptorBlock(std::span<const std::uint8_t> cdb) override {
+    recorded_.cdb.assign(cdb.begin(), cdb.end());
+    return true;
+  }
+  bool setScatterGatherEntries(std::span<const platform::ScatterGatherEntry> entries,
+                               std::uint64_t transferCount,
+                               platform::TransferDirection direction) override {
+    recorded_.entries = entries.size();
+    recorded_.entrySize = entries.empty() ? 0 : entries[0].size();
+    recorded_.transferCount = transferCount;
+    recorded_.direction = direction;
+    return true;
+  }
+  bool setTimeoutDuration(std::chrono::milliseconds timeout) override {
+    recorded_.timeout = timeout;
+    return true;
+  }
+  std::optional<platform::ScsiTaskOutcome> executeTaskSync() override {
+    return platform::ScsiTaskOutcome{};
+  }
+
+ private:
+  Recorded& recorded_;
+};
+
+class RecordingDevice final : public platform::ScsiTaskDevice {
+ public:
+  bool obtainExclusiveAccess() override { return true; }
+  void releaseExclusiveAccess() override {}
+  std::unique_ptr<platform::ScsiTask> createTask() override {
+    return std::make_unique<RecordingTask>(recorded);
+  }
+  Recorded recorded;
+};
+
+TEST(ExecuteInquiry, AsksForOneVitalProductDataPageOf255Bytes) {
+  RecordingDevice device;
+  InquiryBuffer buffer;
+  buffer.fill(0xAA);
+  EXPECT_EQ(executeInquiry(device, buffer, 0xC5), kInquirySuccess);
+  EXPECT_EQ(device.recorded.cdb, (std::vector<std::uint8_t>{0x12, 0x01, 0xC5, 0x00, 0xFF, 0x00}));
+  EXPECT_EQ(device.recorded.entries, 1u);
+  EXPECT_EQ(device.recorded.entrySize, 255u);
+  EXPECT_EQ(device.recorded.transferCount, 255u);
+  EXPECT_EQ(device.recorded.direction, platform::TransferDirection::FromDevice);
+  EXPECT_EQ(device.recorded.timeout, std::chrono::milliseconds(10000));
+  // The buffer is zeroed first, so what the device did not send reads as zeros.
+  EXPECT_EQ(buffer[255], 0);
+}
+
+TEST(ExecuteInquiry, EachFailingStepHasItsResultAndMessage) {
+  using platform::VirtualScsiStep;
+  struct Case {
+    VirtualScsiStep step;
+    std::int32_t result;
+    const char* message;
+  };
+  const Case cases[] = {
+      {VirtualScsiStep::CreateTask, kInquiryNoTask, nullptr},
+      {VirtualScsiStep::SetCommandDescriptorBlock, kInquiryFailed,
+       "Error in SetCommandDescriptorBlock"},
+      {VirtualScsiStep::SetScatterGatherEntries, kInquiryFailed,
+       "Error in SetScatterGatherEntries"},
+      {VirtualScsiStep::SetTimeout, kInquiryFailed, "Error in SetTimeoutDuration"},
+  };
+  test_support::VirtualPlayerFolder player(test_support::checkpointDocument("<true/>"));
+  platform::VirtualHardwareRegistry registry(player.players());
+  platform::VirtualScsiPassThrough passThrough(player.players());
+  std::optional<platform::RegistryIterator> media = registry.matchingServices({"zetovirt0"});
+  ASSERT_TRUE(media);
+  auto nub = registry.parent(*registry.parent(*media->next()));
+  ASSERT_TRUE(nub);
+  auto plugIn = passThrough.createPlugIn(*nub);
+  ASSERT_TRUE(plugIn);
+  auto device = plugIn->scsiTaskDevice();
+  ASSERT_TRUE(device);
+  for (const Case& c : cases) {
+    SCOPED_TRACE(static_cast<int>(c.step));
+    CapturedLog log;
+    passThrough.faults().failingSteps = {c.step};
+    InquiryBuffer buffer{};
+    EXPECT_EQ(executeInquiry(*device, buffer, 0xC0), c.result);
+    if (c.message) {
+      EXPECT_TRUE(log.has(c.message));
+    }
+  }
+  passThrough.faults().failingSteps.clear();
+  InquiryBuffer buffer{};
+  EXPECT_EQ(executeInquiry(*device, buffer, 0xC0), kInquirySuccess);
+  EXPECT_EQ(buffer[1], 0xC0);
+  // The short document fills two pages.
+  EXPECT_EQ(buffer[3], 2);
+  EXPECT_EQ(buffer[4], 0xC2);
+  EXPECT_EQ(buffer[5], 0xC3);
+}
+
+TEST(ExecuteInquiry, NodesThatAreNotScsiDevicesFailCleanly) {
+  platform::test_support::TemporaryFolder folder;
+  test_support::writeFile(folder / "plain", "not a disk");
+  for (const std::filesystem::path& node : {std::filesystem::path("/dev/null"), folder / "plain"}) {
+    SCOPED_TRACE(node);
+    CapturedLog log;
+    auto device = platform::LinuxScsiPassThrough::openTaskDevice({.disk = node, .generic = {}});
+    ASSERT_TRUE(device);
+    ASSERT_TRUE(device->obtainExclusiveAccess());
+    InquiryBuffer buffer{};
+    EXPECT_EQ(executeInquiry(*device, buffer, 0xC0), kInquiryFailed);
+    EXPECT_TRUE(log.has("Error in ExecuteTaskSync"));
+    device->releaseExclusiveAccess();
+  }
+  // A scsi-generic node that is a plain file: the exclusive open works, SG_IO does not.
+  auto device =
+      platform::LinuxScsiPassThrough::openTaskDevice({.disk = {}, .generic = folder / "plain"});
+  ASSERT_TRUE(device);
+  EXPECT_FALSE(device->createTask()) << "no node is open before exclusive access";
+  ASSERT_TRUE(device->obtainExclusiveAccess());
+  InquiryBuffer buffer{};
+  EXPECT_EQ(executeInquiry(*device, buffer, 0xC0), kInquiryFailed);
+
+  EXPECT_FALSE(
+      platform::LinuxScsiPassThrough::openTaskDevice({.disk = folder / "missing", .generic = {}}));
+}
+
+TEST(SenseData, LogsKeyCodeAndQualifier) {
+  CapturedLog log;
+  std::vector<std::uint8_t> sense(18, 0);
+  sense[0] = 0x70;
+  sense[2] = 0xF5;  // flags in the high bits, ILLEGAL REQUEST below
+  sense[12] = 0x24;
+  sense[13] = 0x01;
+  logSenseData(sense);
+  EXPECT_EQ(log.last(), "Key: $05, ASC: $24, ASCQ: $01  ");
+}
+
+}  // namespace
+}  // namespace zt::device
