@@ -10,6 +10,7 @@
 #include <unordered_set>
 #include <utility>
 
+#include "platform/base64.h"
 #include "tessel/schema.h"
 
 namespace tessel {
@@ -103,34 +104,10 @@ std::string_view jsonKindName(const Json& json) {
   }
 }
 
-// ----- base64 (RFC 4648, standard alphabet, padded) -----------------------------------------
+// ----- base64 (RFC 4648, standard alphabet, padded; the encoder is the platform's) ----------
 
 constexpr std::string_view kBase64Alphabet =
     "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";
-
-std::string encodeBase64(const Data& data) {
-  std::string out;
-  out.reserve((data.size() + 2) / 3 * 4);
-  std::size_t i = 0;
-  for (; i + 3 <= data.size(); i += 3) {
-    const std::uint32_t n = (std::uint32_t{data[i]} << 16) | (std::uint32_t{data[i + 1]} << 8) |
-                            std::uint32_t{data[i + 2]};
-    out += kBase64Alphabet[(n >> 18) & 63];
-    out += kBase64Alphabet[(n >> 12) & 63];
-    out += kBase64Alphabet[(n >> 6) & 63];
-    out += kBase64Alphabet[n & 63];
-  }
-  const std::size_t rest = data.size() - i;
-  if (rest > 0) {
-    std::uint32_t n = std::uint32_t{data[i]} << 16;
-    if (rest == 2) n |= std::uint32_t{data[i + 1]} << 8;
-    out += kBase64Alphabet[(n >> 18) & 63];
-    out += kBase64Alphabet[(n >> 12) & 63];
-    out += rest == 2 ? kBase64Alphabet[(n >> 6) & 63] : '=';
-    out += '=';
-  }
-  return out;
-}
 
 // Only the canonical text is accepted (padding present, unused bits zero), so that a byte
 // string has exactly one written form and a damaged text is noticed rather than guessed at.
@@ -345,7 +322,7 @@ Json toJson(const Value& value, const Path& path) {
     case Value::Kind::Url:
       return Json::object({{"$url", value.asUrl()->text}});
     case Value::Kind::Data:
-      return Json::object({{"$data", encodeBase64(*value.asData())}});
+      return Json::object({{"$data", zt::platform::base64::encode(*value.asData())}});
     case Value::Kind::Array: {
       Json out = Json::array();
       std::size_t i = 0;

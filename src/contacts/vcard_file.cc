@@ -1,0 +1,67 @@
+// The file image of the contacts: one card per selected contact of truth.
+#include "contacts/vcard_writer.h"
+#include "contacts/zt_contacts_syncer.h"
+#include "platform/log.h"
+#include "platform/utf16.h"
+#include "sync/sync_status.h"
+#include "sync/zt_sync_manager.h"
+#include "tessel/exception.h"
+#include "tessel/schema.h"
+
+namespace zt::contacts {
+
+using platform::Log;
+
+bool ZTContactsSyncer::isSelected(const platform::Dictionary& contact) {
+  if (!_contactFilter || _contactFilter->useAllContacts()) return true;
+  const platform::Value* parents =
+      contact.find(tessel::TesselRelationship_Contacts_Contact_ParentGroups);
+  const platform::Array* groups = parents ? parents->asArray() : nullptr;
+  if (!groups) return false;
+  const std::set<std::string>& selected = expandedFilteredGroupsIDs();
+  for (const platform::Value& group : *groups) {
+    const std::string* identifier = group.asString();
+    if (identifier && selected.contains(*identifier)) return true;
+  }
+  return false;
+}
+
+bool ZTContactsSyncer::disassembleData() {
+  Log::debug("Disassembling data");
+  _allVCardData.clear();
+  try {
+    std::shared_ptr<tessel::Snapshot> snapshot = contactTruthSnapshot();
+    const tessel::RecordMap contacts = snapshot->recordsMatchingAttributes(
+        {{tessel::TesselRecordEntityNameKey, std::string(tessel::TesselEntity_Contacts_Contact)}});
+    Log::debug("Truth contains %ul contacts", contacts.size());
+
+    VCardWriter writer(*snapshot, _syncManager.shouldSyncContactImages()
+                                      ? &ContactPhotoPreparation::shared()
+                                      : nullptr);
+    tessel::Session& session = *_syncManager.syncSession();
+    std::string card;
+    std::size_t written = 0;
+    for (const auto& [identifier, contact] : contacts) {
+      if (!isSelected(contact)) continue;
+      card.clear();
+      writer.appendCard(card, contact);
+      // One byte-order mark opens the file; the cards follow each other without one.
+      if (written == 0) _allVCardData += "\xFE\xFF";
+      platform::utf16::appendBigEndian(_allVCardData, card);
+      ++written;
+      if (session.isCancelled()) {
+        Log::debug("Sync session is cancelled");
+        _syncManager.setLastStatus(sync::kStatusCancelled);
+        return false;
+      }
+    }
+    Log::debug("Effectively stored %ul contacts on Zeto", written);
+    return true;
+  } catch (const tessel::Exception& exception) {
+    Log::debug("Exception while getting changes:\n%@", exception);
+    _syncManager.setLastStatusForException(exception);
+    return false;
+  }
+}
+
+}  // namespace zt::contacts

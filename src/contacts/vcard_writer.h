@@ -1,0 +1,42 @@
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "contacts/contact_photo.h"
+#include "platform/value.h"
+#include "tessel/snapshot.h"
+
+namespace zt::contacts {
+
+// Builds the vCard 3.0 card (RFC 2426) of one contact of the engine's truth, as UTF-8 text
+// with CR LF line ends. Properties come in a fixed order: N, the optional name lines, ORG,
+// TITLE, NOTE, PHOTO, then one line per related record (TEL, EMAIL, ADR, URL, X-<service>)
+// in the order the snapshot yields them, and CATEGORIES from the contact's groups.
+class VCardWriter {
+ public:
+  // Photos are embedded through `photos` when one is given.
+  VCardWriter(const tessel::Snapshot& snapshot, ContactPhotoPreparation* photos);
+
+  void appendCard(std::string& card, const platform::Dictionary& contact);
+
+ private:
+  void appendEscaped(std::string& card, const platform::Value* value);
+  void appendName(std::string& card, const platform::Dictionary& contact);
+  void appendOrganisation(std::string& card, const platform::Dictionary& contact);
+  void appendRelated(std::string& card, const platform::Dictionary& contact);
+  void appendPhone(std::string& card, const platform::Dictionary& record);
+  void appendEmail(std::string& card, const platform::Dictionary& record);
+  void appendAddress(std::string& card, const platform::Dictionary& record);
+  void appendUrl(std::string& card, const platform::Dictionary& record);
+  void appendIM(std::string& card, const platform::Dictionary& record);
+  void appendCategories(std::string& card);
+
+  const tessel::Snapshot& snapshot_;
+  ContactPhotoPreparation* photos_;
+  // Reused by every value and every card.
+  std::string escaped_;
+  std::vector<std::string> categories_;
+};
+
+}  // namespace zt::contacts

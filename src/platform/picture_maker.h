@@ -1,0 +1,27 @@
+#pragma once
+
+#include <optional>
+
+#include "platform/image_service.h"
+#include "platform/value.h"
+
+namespace zt::platform {
+
+enum class PictureFormat { JPEG, PNG };
+// Flat pictures compress to almost nothing; noisy ones are as large as photographs get.
+enum class PicturePattern { Flat, Gradient, Noise };
+enum class PictureAlpha { None, HalfTransparent };
+
+struct PictureRecipe {
+  PixelSize size;
+  PictureFormat format = PictureFormat::JPEG;
+  PicturePattern pattern = PicturePattern::Gradient;
+  PictureAlpha alpha = PictureAlpha::None;  // PNG only
+  int jpegQuality = 75;
+};
+
+// The encoded bytes of a synthetic picture, made with libvips, for tests and benchmarks that
+// need pictures of known sizes and formats. None when libvips cannot start or encode.
+std::optional<Data> makePicture(const PictureRecipe& recipe);
+
+}  // namespace zt::platform
