@@ -1,0 +1,311 @@
+#include "calendars/calendar_flattener.h"
+
+#include <array>
+#include <utility>
+#include <vector>
+
+#include "calendars/record_description.h"
+#include "platform/log.h"
+#include "tessel/schema.h"
+
+namespace zt::calendars {
+
+using platform::Array;
+using platform::Dictionary;
+using platform::Log;
+using platform::Value;
+using namespace tessel;  // the schema's names, which carry their own prefixes
+
+namespace {
+
+constexpr std::array kEventFilteredKeys{
+    TesselAttribute_Calendars_Event_Summary,        TesselAttribute_Calendars_Event_StartDate,
+    TesselAttribute_Calendars_Event_EndDate,        TesselAttribute_Calendars_Event_AllDay,
+    TesselAttribute_Calendars_Event_OriginalDate,   TesselAttribute_Calendars_Event_Url,
+    TesselAttribute_Calendars_Event_Description,    TesselAttribute_Calendars_Event_Location,
+    TesselAttribute_Calendars_Event_ExceptionDates, TesselAttribute_Calendars_Event_Classification,
+    TesselAttribute_Calendars_Event_Priority,       TesselAttribute_Calendars_Event_Status,
+    TesselAttribute_Calendars_Event_ExceptionDates,
+};
+
+constexpr std::array kTaskFilteredKeys{
+    TesselAttribute_Calendars_Task_OriginalDate,
+    TesselAttribute_Calendars_Task_Summary,
+    TesselAttribute_Calendars_Task_Url,
+    TesselAttribute_Calendars_Task_Description,
+    TesselAttribute_Calendars_Task_CompletionDate,
+    TesselAttribute_Calendars_Task_StartDate,
+    TesselAttribute_Calendars_Task_DueDate,
+    TesselAttribute_Calendars_Task_Status,
+    TesselAttribute_Calendars_Task_ExceptionDates,
+    TesselAttribute_Calendars_Task_Priority,
+    TesselAttribute_Calendars_Task_Classification,
+};
+
+constexpr std::array kKeysForRecurrence{
+    TesselAttribute_Calendars_Recurrence_Frequency,
+    TesselAttribute_Calendars_Recurrence_Until,
+    TesselAttribute_Calendars_Recurrence_Count,
+    TesselAttribute_Calendars_Recurrence_Interval,
+    TesselAttribute_Calendars_Recurrence_Bymonth,
+    TesselAttribute_Calendars_Recurrence_Byweeknumber,
+    TesselAttribute_Calendars_Recurrence_Byyearday,
+    TesselAttribute_Calendars_Recurrence_Bymonthday,
+    TesselAttribute_Calendars_Recurrence_Bydayfreq,
+    TesselAttribute_Calendars_Recurrence_Bydaydays,
+    TesselAttribute_Calendars_Recurrence_Bysetpos,
+    TesselAttribute_Calendars_Recurrence_Weekstartday,
+};
+
+constexpr std::array kKeysForAudioAlarm{
+    TesselAttribute_Calendars_AudioAlarm_Triggerdate,
+    TesselAttribute_Calendars_AudioAlarm_Triggerduration,
+    TesselAttribute_Calendars_AudioAlarm_RepeatCount,
+    TesselAttribute_Calendars_AudioAlarm_RepeatInterval,
+    TesselAttribute_Calendars_AudioAlarm_Description,
+    TesselAttribute_Calendars_AudioAlarm_Summary,
+};
+
+constexpr std::array kKeysForMailAlarm{
+    TesselAttribute_Calendars_MailAlarm_Triggerdate,
+    TesselAttribute_Calendars_MailAlarm_Triggerduration,
+    TesselAttribute_Calendars_MailAlarm_RepeatCount,
+    TesselAttribute_Calendars_MailAlarm_RepeatInterval,
+    TesselAttribute_Calendars_MailAlarm_Description,
+    TesselAttribute_Calendars_MailAlarm_Summary,
+    TesselAttribute_Calendars_MailAlarm_Recipients,
+};
+
+constexpr std::array kKeysForDisplayAlarm{
+    TesselAttribute_Calendars_DisplayAlarm_Triggerdate,
+    TesselAttribute_Calendars_DisplayAlarm_Triggerduration,
+    TesselAttribute_Calendars_DisplayAlarm_RepeatCount,
+    TesselAttribute_Calendars_DisplayAlarm_RepeatInterval,
+    TesselAttribute_Calendars_DisplayAlarm_Description,
+};
+
+constexpr std::array kKeysForOrganizer{
+    TesselAttribute_Calendars_Organizer_DirectoryEntry,
+    TesselAttribute_Calendars_Organizer_CommonName,
+    TesselAttribute_Calendars_Organizer_Email,
+};
+
+constexpr std::array kKeysForAttendee{
+    TesselAttribute_Calendars_Attendee_DirectoryEntry,
+    TesselAttribute_Calendars_Attendee_CommonName,
+    TesselAttribute_Calendars_Attendee_Email,
+    TesselAttribute_Calendars_Attendee_UserType,
+    TesselAttribute_Calendars_Attendee_Role,
+    TesselAttribute_Calendars_Attendee_Status,
+    TesselAttribute_Calendars_Attendee_Rsvp,
+    TesselAttribute_Calendars_Attendee_Delegatedto,
+    TesselAttribute_Calendars_Attendee_Delegatedfrom,
+};
+
+// A list of its own, although it holds the attendee names.
+constexpr std::array kKeysForExDates = kKeysForAttendee;
+
+// An event's related records, in the order they are copied in.
+struct SubEntity {
+  std::string_view relationship;
+  KeyList keys;
+  std::string_view icalKey;
+};
+
+const std::array<SubEntity, 6>& subEntities() {
+  static const std::array<SubEntity, 6> table{{
+      {TesselRelationship_Calendars_Event_Recurrences, kKeysForRecurrence,
+       TesselEntity_Calendars_Recurrence},
+      {TesselRelationship_Calendars_Event_AudioAlarms, kKeysForAudioAlarm,
+       TesselEntity_Calendars_AudioAlarm},
+      {TesselRelationship_Calendars_Event_MailAlarms, kKeysForMailAlarm,
+       TesselEntity_Calendars_MailAlarm},
+      {TesselRelationship_Calendars_Event_DisplayAlarms, kKeysForDisplayAlarm,
+       TesselEntity_Calendars_DisplayAlarm},
+      {TesselRelationship_Calendars_Event_Organizer, kKeysForOrganizer,
+       TesselEntity_Calendars_Organizer},
+      {TesselRelationship_Calendars_Event_Attendees, kKeysForAttendee,
+       TesselEntity_Calendars_Attendee},
+  }};
+  return table;
+}
+
+// Copies the values of the listed keys that the source has, and nothing else.
+void copyKeys(const Dictionary& source, Dictionary& destination, KeyList keys) {
+  for (std::string_view key : keys) {
+    if (const Value* value = source.find(key)) destination.set(key, *value);
+  }
+}
+
+// The identifier strings of a relationship value; anything but an array of strings holds none.
+std::vector<std::string> identifiersOf(const Value* relationship) {
+  std::vector<std::string> identifiers;
+  const Array* array = relationship ? relationship->asArray() : nullptr;
+  if (!array) return identifiers;
+  identifiers.reserve(array->size());
+  for (const Value& element : *array) {
+    if (const std::string* identifier = element.asString()) identifiers.push_back(*identifier);
+  }
+  return identifiers;
+}
+
+const Array& emptyArray() {
+  static const Array empty;
+  return empty;
+}
+
+}  // namespace
+
+KeyList CalendarFlattener::eventFilteredKeys() {
+  return kEventFilteredKeys;
+}
+KeyList CalendarFlattener::taskFilteredKeys() {
+  return kTaskFilteredKeys;
+}
+KeyList CalendarFlattener::keysForRecurrence() {
+  return kKeysForRecurrence;
+}
+KeyList CalendarFlattener::keysForAudioAlarm() {
+  return kKeysForAudioAlarm;
+}
+KeyList CalendarFlattener::keysForMailAlarm() {
+  return kKeysForMailAlarm;
+}
+KeyList CalendarFlattener::keysForDisplayAlarm() {
+  return kKeysForDisplayAlarm;
+}
+KeyList CalendarFlattener::keysForOrganizer() {
+  return kKeysForOrganizer;
+}
+KeyList CalendarFlattener::keysForAttendee() {
+  return kKeysForAttendee;
+}
+KeyList CalendarFlattener::keysForExDates() {
+  return kKeysForExDates;
+}
+
+std::string CalendarFlattener::orderString(std::size_t order) {
+  return std::to_string(order + 1) + "l";
+}
+
+bool CalendarFlattener::appendCalSubEntities(const Array& identifiers, KeyList filteredKeys,
+                                             std::string_view icalKey,
+                                             Dictionary& filteredRecord) const {
+  if (identifiers.empty()) return true;
+  // The key is there even when none of the records can be found.
+  filteredRecord.set(icalKey, Array{});
+  std::vector<std::string> wanted;
+  wanted.reserve(identifiers.size());
+  for (const Value& element : identifiers) {
+    if (const std::string* identifier = element.asString()) wanted.push_back(*identifier);
+  }
+  tessel::RecordMap records = snapshot_.recordsWithIdentifiers(wanted);
+  Array flattened;
+  flattened.reserve(records.size());
+  for (const auto& [identifier, record] : records) {
+    Dictionary subRecord;
+    copyKeys(record, subRecord, filteredKeys);
+    flattened.emplace_back(std::move(subRecord));
+  }
+  filteredRecord.set(icalKey, std::move(flattened));
+  return true;
+}
+
+bool CalendarFlattener::appendCalEntity(const Dictionary& record, Array* eventArray,
+                                        Array* taskArray,
+                                        const tessel::RecordMap& allEntities) const {
+  const Value* entityValue = record.find(TesselRecordEntityNameKey);
+  const std::string* entity = entityValue ? entityValue->asString() : nullptr;
+  if (!entity) {
+    Log::debug("No entity type for calendar record:\n%@", RecordDescription{record});
+    return true;
+  }
+
+  if (*entity == TesselEntity_Calendars_Event) {
+    Dictionary event;
+    copyKeys(record, event, kEventFilteredKeys);
+    for (const SubEntity& sub : subEntities()) {
+      const Value* relationship = record.find(sub.relationship);
+      if (!relationship) continue;
+      const Array* identifiers = relationship->asArray();
+      if (!appendCalSubEntities(identifiers ? *identifiers : emptyArray(), sub.keys, sub.icalKey,
+                                event)) {
+        return false;
+      }
+    }
+
+    std::vector<std::string> detached =
+        identifiersOf(record.find(TesselRelationship_Calendars_Event_DetachedEvents));
+    if (!detached.empty()) {
+      // A detached occurrence replaces one instance of the rule, so the rule must skip it.
+      Array exceptionDates;
+      if (const Value* copied = event.find(TesselAttribute_Calendars_Event_ExceptionDates)) {
+        if (const Array* dates = copied->asArray()) exceptionDates = *dates;
+      }
+      for (const std::string& identifier : detached) {
+        auto occurrence = allEntities.find(identifier);
+        if (occurrence == allEntities.end()) continue;
+        if (const Value* date =
+                occurrence->second.find(TesselAttribute_Calendars_Event_OriginalDate)) {
+          exceptionDates.push_back(*date);
+        }
+      }
+      event.set(TesselAttribute_Calendars_Event_ExceptionDates, std::move(exceptionDates));
+    }
+
+    if (eventArray) eventArray->emplace_back(std::move(event));
+    return true;
+  }
+
+  if (*entity == TesselEntity_Calendars_Task) {
+    Dictionary task;
+    copyKeys(record, task, kTaskFilteredKeys);
+    if (taskArray) taskArray->emplace_back(std::move(task));
+    return true;
+  }
+
+  Log::debug("Unkown calendar entity type:\n%@", RecordDescription{record});
+  return true;
+}
+
+std::optional<Dictionary> CalendarFlattener::flattenCalendar(const Dictionary& calendar,
+                                                             const std::string& title,
+                                                             std::size_t order) const {
+  Dictionary flattened;
+  flattened.set(TesselAttribute_Calendars_Calendar_Title, title);
+  flattened.set(TesselEntity_Calendars_CalendarOrder, orderString(order));
+
+  const Value* eventsValue = calendar.find(TesselRelationship_Calendars_Calendar_Events);
+  const Value* tasksValue = calendar.find(TesselRelationship_Calendars_Calendar_Tasks);
+  std::optional<Array> events;
+  std::optional<Array> tasks;
+  std::vector<std::string> members;
+  if (eventsValue) {
+    members = identifiersOf(eventsValue);
+    events.emplace();
+  }
+  if (tasksValue) {
+    std::vector<std::string> taskIDs = identifiersOf(tasksValue);
+    members.insert(members.end(), std::make_move_iterator(taskIDs.begin()),
+                   std::make_move_iterator(taskIDs.end()));
+    tasks.emplace();
+  }
+
+  if (eventsValue || tasksValue) {
+    // One request for the whole calendar; the same map answers the detached occurrences.
+    tessel::RecordMap allEntities = snapshot_.recordsWithIdentifiers(members);
+    if (events) events->reserve(allEntities.size());
+    for (const auto& [identifier, record] : allEntities) {
+      if (!appendCalEntity(record, events ? &*events : nullptr, tasks ? &*tasks : nullptr,
+                           allEntities)) {
+        return std::nullopt;
+      }
+    }
+  }
+
+  if (events) flattened.set(TesselEntity_Calendars_Event, std::move(*events));
+  if (tasks) flattened.set(TesselEntity_Calendars_Task, std::move(*tasks));
+  return flattened;
+}
+
+}  // namespace zt::calendars

@@ -1,0 +1,193 @@
+// The flattening of one calendar against a real store's snapshot, in process, where the
+// nested record itself can be compared.
+#include "calendars/calendar_flattener.h"
+
+#include <gtest/gtest.h>
+#include <stdlib.h>
+
+#include <filesystem>
+#include <memory>
+#include <string>
+#include <system_error>
+#include <vector>
+
+#include "tessel/schema.h"
+#include "tessel/store.h"
+
+namespace zt::calendars {
+namespace {
+
+namespace fs = std::filesystem;
+using platform::Array;
+using platform::Dictionary;
+using platform::Value;
+
+constexpr std::string_view kEntity = tessel::TesselRecordEntityNameKey;
+constexpr std::string_view kEvent = tessel::TesselEntity_Calendars_Event;
+constexpr std::string_view kTask = tessel::TesselEntity_Calendars_Task;
+
+Array ids(std::initializer_list<const char*> identifiers) {
+  Array array;
+  for (const char* identifier : identifiers) array.emplace_back(identifier);
+  return array;
+}
+
+// The flattener passes values through untouched, so dates may stand in as plain texts.
+class CalendarFlattenerTest : public ::testing::Test {
+ protected:
+  void SetUp() override {
+    std::string pattern = (fs::temp_directory_path() / "zt-flatten-XXXXXX").string();
+    ASSERT_NE(::mkdtemp(pattern.data()), nullptr);
+    folder_ = pattern;
+    store_ = tessel::Store::open(folder_ / "truth.db");
+    client_ = store_->registerClient("client", "Zeto", {});
+  }
+  void TearDown() override {
+    snapshot_.reset();
+    client_.reset();
+    store_.reset();
+    std::error_code ignored;
+    fs::remove_all(folder_, ignored);
+  }
+
+  void put(std::string id, Dictionary record) { store_->putRecords({{std::move(id), record}}); }
+
+  const tessel::Snapshot& snapshot() {
+    if (!snapshot_) snapshot_ = store_->snapshotOfRecordsInTruth({}, *client_);
+    return *snapshot_;
+  }
+
+  // The flattened calendar of a calendar record that is not stored itself.
+  Dictionary flatten(const Dictionary& calendar, std::size_t order = 0) {
+    std::optional<Dictionary> flattened =
+        CalendarFlattener(snapshot()).flattenCalendar(calendar, "Title", order);
+    EXPECT_TRUE(flattened.has_value());
+    return flattened.value_or(Dictionary{});
+  }
+
+  fs::path folder_;
+  std::unique_ptr<tessel::Store> store_;
+  std::unique_ptr<tessel::Client> client_;
+  std::shared_ptr<tessel::Snapshot> snapshot_;
+};
+
+TEST_F(CalendarFlattenerTest, AnEventKeepsItsListedKeysAndItsRelatedRecordsInTableOrder) {
+  put("ev", Dictionary{{kEntity, kEvent},
+                       {"uid", "not listed"},
+                       {"summary", "Lunch"},
+                       {"attendees", ids({"att", "att-missing"})},
+                       {"recurrences", Array{}},
+                       {"organizer", ids({"org"})},
+                       {"display alarms", ids({"alarm"})},
+                       {"priority", Value::integer(5)},
+                       {"calendar", ids({"cal"})}});
+  put("att", Dictionary{{kEntity, tessel::TesselEntity_Calendars_Attendee},
+                        {"email", "mailto:b@example.org"},
+                        {"note", "not listed"},
+                        {"common name", "B"}});
+  put("org", Dictionary{{kEntity, tessel::TesselEntity_Calendars_Organizer},
+                        {"email", "mailto:a@example.org"}});
+  put("alarm", Dictionary{{kEntity, tessel::TesselEntity_Calendars_DisplayAlarm},
+                          {"trigger duration", Value::integer(-900)},
+                          {"summary", "display alarms have no summary"}});
+
+  Dictionary flattened = flatten(Dictionary{{"events", ids({"ev"})}});
+
+  // Key-list order, then the related records in the table's order whatever the record's.
+  Dictionary event{
+      {"summary", "Lunch"},
+      {"priority", Value::integer(5)},
+      {tessel::TesselEntity_Calendars_DisplayAlarm,
+       Array{Dictionary{{"trigger duration", Value::integer(-900)}}}},
+      {tessel::TesselEntity_Calendars_Organizer,
+       Array{Dictionary{{"email", "mailto:a@example.org"}}}},
+      {tessel::TesselEntity_Calendars_Attendee,
+       Array{Dictionary{{"common name", "B"}, {"email", "mailto:b@example.org"}}}},
+  };
+  EXPECT_EQ(flattened, (Dictionary{{"title", "Title"},
+                                   {tessel::TesselEntity_Calendars_CalendarOrder, "1l"},
+                                   {kEvent, Array{event}}}));
+}
+
+TEST_F(CalendarFlattenerTest, RelatedRecordsMissingFromTruthLeaveAnEmptyArray) {
+  put("ev",
+      Dictionary{{kEntity, kEvent}, {"organizer", ids({"gone"})}, {"recurrences", ids({"gone"})}});
+
+  Dictionary flattened = flatten(Dictionary{{"events", ids({"ev"})}});
+
+  EXPECT_EQ(*flattened.find(kEvent),
+            Value(Array{Dictionary{{tessel::TesselEntity_Calendars_Recurrence, Array{}},
+                                   {tessel::TesselEntity_Calendars_Organizer, Array{}}}}));
+}
+
+TEST_F(CalendarFlattenerTest, DetachedOccurrencesAddTheirOriginalDatesOnlyFromThisCalendar) {
+  // No stored exception dates: the dates come after the related records.
+  put("master", Dictionary{{kEntity, kEvent},
+                           {"summary", "Standup"},
+                           {"detached events", ids({"moved-2", "elsewhere", "moved-1", "plain"})},
+                           {"recurrences", ids({"rule"})}});
+  put("rule",
+      Dictionary{{kEntity, tessel::TesselEntity_Calendars_Recurrence}, {"frequency", "daily"}});
+  put("moved-1", Dictionary{{kEntity, kEvent}, {"original date", "day 1"}});
+  put("moved-2", Dictionary{{kEntity, kEvent}, {"original date", "day 2"}});
+  put("plain", Dictionary{{kEntity, kEvent}});  // no original date: adds nothing
+  put("elsewhere", Dictionary{{kEntity, kEvent}, {"original date", "day 9"}});
+  // Only detached occurrences of other calendars: the dates stay as stored.
+  put("lonely", Dictionary{{kEntity, kEvent},
+                           {"exception dates", Array{Value("day 0")}},
+                           {"detached events", ids({"elsewhere"})}});
+
+  Dictionary flattened =
+      flatten(Dictionary{{"events", ids({"master", "moved-1", "moved-2", "plain", "lonely"})}});
+
+  const Array& events = *flattened.find(kEvent)->asArray();
+  ASSERT_EQ(events.size(), 5u);  // the occurrences are events of their own
+  // Events come in the snapshot's order: lonely, master, moved-1, moved-2, plain.
+  EXPECT_EQ(events[0], Value(Dictionary{{"exception dates", Array{Value("day 0")}}}));
+  EXPECT_EQ(events[1],
+            Value(Dictionary{{"summary", "Standup"},
+                             {tessel::TesselEntity_Calendars_Recurrence,
+                              Array{Dictionary{{"frequency", "daily"}}}},
+                             {"exception dates", Array{Value("day 2"), Value("day 1")}}}));
+  EXPECT_EQ(events[2], Value(Dictionary{{"original date", "day 1"}}));
+}
+
+TEST_F(CalendarFlattenerTest, TasksKeepOnlyTheirListAndRecordsOfOtherKindsAreLeftOut) {
+  put("task", Dictionary{{kEntity, kTask},
+                         {"due date", "tomorrow"},
+                         {"location", "not a task key"},
+                         {"recurrences", ids({"rule"})},
+                         {"summary", "Pay"}});
+  put("rule",
+      Dictionary{{kEntity, tessel::TesselEntity_Calendars_Recurrence}, {"frequency", "daily"}});
+  put("cal", Dictionary{{kEntity, tessel::TesselEntity_Calendars_Calendar}, {"title", "A"}});
+  put("ev", Dictionary{{kEntity, kEvent}, {"summary", "Lunch"}});
+
+  Dictionary flattened =
+      flatten(Dictionary{{"events", ids({"cal", "ev"})}, {"tasks", ids({"task"})}}, 2);
+
+  EXPECT_EQ(flattened,
+            (Dictionary{{"title", "Title"},
+                        {tessel::TesselEntity_Calendars_CalendarOrder, "3l"},
+                        {kEvent, Array{Dictionary{{"summary", "Lunch"}}}},
+                        {kTask, Array{Dictionary{{"summary", "Pay"}, {"due date", "tomorrow"}}}}}));
+}
+
+TEST_F(CalendarFlattenerTest, AnArrayTheCalendarDoesNotHaveDropsItsRecords) {
+  put("task", Dictionary{{kEntity, kTask}, {"summary", "Pay"}});
+  put("ev", Dictionary{{kEntity, kEvent}, {"summary", "Lunch"}});
+
+  // Only an events relationship, listing a task: no task array, so the task goes nowhere.
+  EXPECT_EQ(flatten(Dictionary{{"events", ids({"ev", "task"})}}),
+            (Dictionary{{"title", "Title"},
+                        {tessel::TesselEntity_Calendars_CalendarOrder, "1l"},
+                        {kEvent, Array{Dictionary{{"summary", "Lunch"}}}}}));
+  // Neither relationship: title and order alone.
+  EXPECT_EQ(flatten(Dictionary{}),
+            (Dictionary{{"title", "Title"}, {tessel::TesselEntity_Calendars_CalendarOrder, "1l"}}));
+  // An empty relationship still gives its array.
+  EXPECT_EQ(flatten(Dictionary{{"tasks", Array{}}}).find(kTask)->asArray()->size(), 0u);
+}
+
+}  // namespace
+}  // namespace zt::calendars

@@ -1,0 +1,338 @@
+// The calendars half of a sync, end to end: the real zetosynctool on a store filled by the
+// real `tessel` command and a virtual player, judged by the files on the player, the
+// progress notifications and the log.
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <spawn.h>
+#include <sys/wait.h>
+
+#include <fstream>
+#include <initializer_list>
+#include <sstream>
+#include <string>
+#include <vector>
+
+#include "sync/synctool_fixture.h"
+
+extern char** environ;
+
+namespace zt::sync::test_support {
+namespace {
+
+const std::string kUploading = "TesselClientUploadingPhase";
+
+std::string readFile(const fs::path& path) {
+  std::ifstream in(path, std::ios::binary);
+  std::ostringstream text;
+  text << in.rdbuf();
+  return text.str();
+}
+
+Json date(const std::string& wallClock, const std::string& zone = "UTC") {
+  return Json{{"$date", wallClock}, {"tz", zone}};
+}
+
+Json record(const std::string& id, Json fields) {
+  return Json{{"id", id}, {"record", fields}};
+}
+
+Json calendar(const std::string& id, const std::string& title, std::vector<std::string> events) {
+  return record(id, Json{{"tessel.record.entity", "tessel.calendars.Calendar"},
+                         {"title", title},
+                         {"events", events}});
+}
+
+Json event(const std::string& id, const std::string& summary, const std::string& start) {
+  return record(id, Json{{"tessel.record.entity", "tessel.calendars.Event"},
+                         {"summary", summary},
+                         {"start date", date(start)}});
+}
+
+class CalendarsSync : public SynctoolTest {
+ protected:
+  void SetUp() override {
+    SynctoolTest::SetUp();
+    tessel({"client", "register", std::string(kClientID), "--calendars"});
+  }
+
+  // Runs `tessel --store <the test's store> args...`; the test fails when it fails.
+  void tessel(const std::vector<std::string>& args) {
+    std::vector<std::string> all = {TESSEL_BINARY, "--store", (folder() / "truth.db").string()};
+    all.insert(all.end(), args.begin(), args.end());
+    std::vector<char*> argv;
+    for (std::string& arg : all) argv.push_back(arg.data());
+    argv.push_back(nullptr);
+    const std::string output = (folder() / "tessel.out").string();
+    posix_spawn_file_actions_t actions;
+    posix_spawn_file_actions_init(&actions);
+    posix_spawn_file_actions_addopen(&actions, 1, output.c_str(), O_WRONLY | O_CREAT | O_TRUNC,
+                                     0644);
+    posix_spawn_file_actions_adddup2(&actions, 1, 2);
+    pid_t pid = 0;
+    int status = -1;
+    if (posix_spawn(&pid, argv[0], &actions, nullptr, argv.data(), environ) == 0) {
+      waitpid(pid, &status, 0);
+    }
+    posix_spawn_file_actions_destroy(&actions);
+    ASSERT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0)
+        << "tessel " << ::testing::PrintToString(args) << ": " << readFile(output);
+  }
+
+  void put(std::initializer_list<Json> records) {
+    const fs::path file = folder() / "records.jsonl";
+    std::ofstream out(file, std::ios::trunc);
+    for (const Json& line : records) out << line.dump() << "\n";
+    out.close();
+    tessel({"records", "put", file.string()});
+  }
+
+  fs::path calendarsFolder() const { return volume() / "Calendars"; }
+  std::string calendarFile(const std::string& name) const {
+    return readFile(calendarsFolder() / name);
+  }
+  std::vector<std::string> calendarFiles() const {
+    std::vector<std::string> names;
+    for (const auto& entry : fs::directory_iterator(calendarsFolder())) {
+      names.push_back(entry.path().filename().string());
+    }
+    std::sort(names.begin(), names.end());
+    return names;
+  }
+
+  static std::vector<double> uploadingProgress(const SynctoolRun& run) {
+    std::vector<double> progress;
+    for (const Json& note : run.notifications) {
+      const Json& info = note["userInfo"];
+      if (info["TesselClientCurrentPhase"] == kUploading) {
+        EXPECT_FALSE(info.contains("TesselClientDataClassProgressionPhase"));
+        progress.push_back(info["TesselClientPercentProgressionPhase"].get<double>());
+      }
+    }
+    return progress;
+  }
+};
+
+bool contains(const std::string& text, const std::string& part) {
+  return text.find(part) != std::string::npos;
+}
+
+TEST_F(CalendarsSync, WritesOneFilePerCalendarInTheUsersOrderAndEmptiesTheFolderFirst) {
+  put({calendar("cal-home", "Home", {"ev-1"}), calendar("cal-work", "Work/Office", {"ev-2"}),
+       event("ev-1", "Lunch", "2007-03-15T12:30:00"),
+       event("ev-2", "Meeting", "2007-03-16T09:00:00")});
+  tessel({"calendars", "order", "cal-work", "cal-home"});
+  // What the tool never wrote goes too, folders included.
+  fs::create_directories(calendarsFolder() / "old" / "inner");
+  std::ofstream(calendarsFolder() / "stray.ics") << "BEGIN:VCALENDAR\r\n";
+  std::ofstream(calendarsFolder() / "old" / "inner" / "notes.txt") << "x";
+
+  const SynctoolRun run = syncClient(kClientID);
+
+  EXPECT_EQ(run.finalStatus(), 0) << run.log;
+  // Two steps per calendar, the syncer's closing 100, then the manager's 100 for the run.
+  EXPECT_EQ(uploadingProgress(run), (std::vector<double>{0, 34, 50.5, 67, 83.5, 100, 100, 100}));
+  EXPECT_EQ(calendarFiles(),
+            (std::vector<std::string>{"Tessel-Home.ics", "Tessel-Work_Office.ics"}));
+  const std::string work = calendarFile("Tessel-Work_Office.ics");
+  EXPECT_TRUE(contains(work, "X-WR-CALNAME:Work/Office\r\nX-WR-CALORDER:1l\r\n")) << work;
+  EXPECT_TRUE(contains(work, "SUMMARY:Meeting\r\n")) << work;
+  const std::string home = calendarFile("Tessel-Home.ics");
+  EXPECT_TRUE(contains(home, "X-WR-CALNAME:Home\r\nX-WR-CALORDER:2l\r\n")) << home;
+  EXPECT_TRUE(contains(home, "SUMMARY:Lunch\r\nDTSTART:20070315T123000Z\r\n")) << home;
+  EXPECT_TRUE(run.logged("Removing stray.ics")) << run.log;
+  EXPECT_TRUE(run.logged("Removing old")) << run.log;
+  EXPECT_TRUE(run.logged("Uploading changes for calendar 'Work/Office' to Zeto (" +
+                         std::to_string(work.size()) + "l bytes)"))
+      << run.log;
+  // The accepted changes were committed: the client now holds the calendar records.
+  EXPECT_GT(client(kClientID)->mirrorSize(), 0u);
+}
+
+TEST_F(CalendarsSync, TwoCalendarsWithOneTitleLeaveTheLaterOneInOneFile) {
+  put({calendar("cal-a", "Family", {"ev-a"}), calendar("cal-b", "Family", {"ev-b"}),
+       event("ev-a", "Earlier", "2007-03-15T12:30:00"),
+       event("ev-b", "Later", "2007-03-16T09:00:00")});
+  tessel({"calendars", "order", "cal-a", "cal-b"});
+
+  const SynctoolRun run = syncClient(kClientID);
+
+  EXPECT_EQ(run.finalStatus(), 0) << run.log;
+  ASSERT_EQ(calendarFiles(), std::vector<std::string>{"Tessel-Family.ics"});
+  const std::string text = calendarFile("Tessel-Family.ics");
+  EXPECT_TRUE(contains(text, "X-WR-CALORDER:2l\r\n")) << text;
+  EXPECT_TRUE(contains(text, "SUMMARY:Later\r\n")) << text;
+  EXPECT_FALSE(contains(text, "Earlier")) << text;
+}
+
+TEST_F(CalendarsSync, ACalendarWithoutTitleIsSkippedWithoutFailingTheRun) {
+  put({record("cal-untitled", Json{{"tessel.record.entity", "tessel.calendars.Calendar"},
+                                   {"events", Json::array()}}),
+       calendar("cal-home", "Home", {})});
+  tessel({"calendars", "order", "cal-untitled", "cal-home"});
+
+  const SynctoolRun run = syncClient(kClientID);
+
+  EXPECT_EQ(run.finalStatus(), 0) << run.log;
+  EXPECT_TRUE(run.logged("Calendar has no name - ignoring this calendar")) << run.log;
+  // The skipped calendar does not advance the progress.
+  EXPECT_EQ(uploadingProgress(run), (std::vector<double>{0, 34, 50.5, 67, 100, 100}));
+  EXPECT_EQ(calendarFiles(), std::vector<std::string>{"Tessel-Home.ics"});
+  // The order follows the position in the list, skipped calendars counted.
+  EXPECT_TRUE(contains(calendarFile("Tessel-Home.ics"), "X-WR-CALORDER:2l\r\n"));
+}
+
+TEST_F(CalendarsSync, ACalendarMissingFromTruthEndsTheCalendarsSyncWithAnError) {
+  put({calendar("cal-gone", "Gone", {}), calendar("cal-home", "Home", {})});
+  tessel({"calendars", "order", "cal-gone", "cal-home"});
+  tessel({"records", "delete", "cal-gone"});
+  std::ofstream(calendarsFolder() / "stray.ics") << "x";
+
+  const SynctoolRun run = syncClient(kClientID);
+
+  EXPECT_EQ(run.finalStatus(), 2) << run.log;
+  EXPECT_TRUE(run.logged("Can't get calendar record in truth")) << run.log;
+  EXPECT_FALSE(run.logged("Commiting accepted changes")) << run.log;
+  // The folder was emptied, nothing after the missing calendar was written, and the
+  // calendars syncer still closed with 100 (the manager's own 100 is not posted).
+  EXPECT_TRUE(calendarFiles().empty());
+  EXPECT_EQ(uploadingProgress(run), (std::vector<double>{0, 34, 100}));
+}
+
+TEST_F(CalendarsSync, WithoutACalendarOrderCalendarsGoInTheEnginesOrder) {
+  // Two writes, so that the engine offers cal-z before cal-a.
+  put({calendar("cal-z", "Zulu", {})});
+  put({calendar("cal-a", "Alpha", {})});
+
+  const SynctoolRun run = syncClient(kClientID);
+
+  EXPECT_EQ(run.finalStatus(), 0) << run.log;
+  EXPECT_FALSE(run.logContains("*** Can't get list order of calendars!"));
+  EXPECT_TRUE(run.logged("Use all calendars")) << run.log;
+  EXPECT_TRUE(contains(calendarFile("Tessel-Zulu.ics"), "X-WR-CALORDER:1l\r\n"));
+  EXPECT_TRUE(contains(calendarFile("Tessel-Alpha.ics"), "X-WR-CALORDER:2l\r\n"));
+}
+
+TEST_F(CalendarsSync, AnOrderRecordWithoutListIsReportedEvenWithoutDebugLogAndFallsBack) {
+  put({calendar("cal-z", "Zulu", {})});
+  put({calendar("cal-a", "Alpha", {})});
+  put({record("order", Json{{"tessel.record.entity", "tessel.calendars.CalendarOrder"}})});
+  setDebugLog(false);
+
+  const SynctoolRun run = syncClient(kClientID);
+
+  EXPECT_EQ(run.finalStatus(), 0) << run.log;
+  EXPECT_EQ(run.log, "*** Can't get list order of calendars!\n");
+  EXPECT_TRUE(contains(calendarFile("Tessel-Zulu.ics"), "X-WR-CALORDER:1l\r\n"));
+  EXPECT_TRUE(contains(calendarFile("Tessel-Alpha.ics"), "X-WR-CALORDER:2l\r\n"));
+}
+
+TEST_F(CalendarsSync, TheFilterSelectsCalendarsAndTheUsersOrderIsKept) {
+  put({calendar("cal-a", "Alpha", {}), calendar("cal-b", "Bravo", {}),
+       calendar("cal-c", "Charlie", {})});
+  tessel({"calendars", "order", "cal-c", "cal-b", "cal-a"});
+  tessel({"client", "filter", std::string(kClientID), "calendars", "--calendars", "cal-a,cal-c"});
+
+  const SynctoolRun run = syncClient(kClientID);
+
+  EXPECT_EQ(run.finalStatus(), 0) << run.log;
+  EXPECT_EQ(calendarFiles(), (std::vector<std::string>{"Tessel-Alpha.ics", "Tessel-Charlie.ics"}));
+  EXPECT_TRUE(contains(calendarFile("Tessel-Charlie.ics"), "X-WR-CALORDER:1l\r\n"));
+  EXPECT_TRUE(contains(calendarFile("Tessel-Alpha.ics"), "X-WR-CALORDER:2l\r\n"));
+  EXPECT_TRUE(run.logContains("Filtered calendar IDs are:\n(cal-c, cal-a)")) << run.log;
+}
+
+TEST_F(CalendarsSync, DetachedOccurrencesBecomeExceptionDatesAndEventsOfTheirOwn) {
+  Json master = event("ev-master", "Standup", "2007-03-05T09:00:00");
+  master["record"]["exception dates"] = Json::array({date("2007-03-06T09:00:00")});
+  master["record"]["recurrences"] = Json::array({"rule"});
+  // The second one belongs to another calendar and adds nothing.
+  master["record"]["detached events"] = Json::array({"ev-moved-2", "ev-elsewhere", "ev-moved-1"});
+  Json moved1 = event("ev-moved-1", "Standup (moved)", "2007-03-07T10:00:00");
+  moved1["record"]["original date"] = date("2007-03-07T09:00:00");
+  Json moved2 = event("ev-moved-2", "Standup (late)", "2007-03-08T11:00:00");
+  moved2["record"]["original date"] = date("2007-03-08T09:00:00");
+  Json elsewhere = event("ev-elsewhere", "Elsewhere", "2007-03-09T11:00:00");
+  elsewhere["record"]["original date"] = date("2007-03-09T09:00:00");
+  put({calendar("cal-team", "Team", {"ev-master", "ev-moved-1", "ev-moved-2"}),
+       calendar("cal-other", "Other", {"ev-elsewhere"}), master, moved1, moved2, elsewhere,
+       record("rule", Json{{"tessel.record.entity", "tessel.calendars.Recurrence"},
+                           {"frequency", "daily"},
+                           {"count", 10}})});
+  tessel({"calendars", "order", "cal-team"});
+
+  const SynctoolRun run = syncClient(kClientID);
+
+  EXPECT_EQ(run.finalStatus(), 0) << run.log;
+  const std::string text = calendarFile("Tessel-Team.ics");
+  // Stored exception dates first, then the moved occurrences in the relationship's order.
+  EXPECT_TRUE(contains(text,
+                       "DTSTART:20070305T090000Z\r\n"
+                       "EXDATE:20070306T090000Z\r\n"
+                       "EXDATE:20070308T090000Z\r\n"
+                       "EXDATE:20070307T090000Z\r\n"
+                       "RRULE:FREQ=DAILY;COUNT=10\r\n"))
+      << text;
+  EXPECT_FALSE(contains(text, "20070309T090000Z")) << text;
+  EXPECT_TRUE(contains(text,
+                       "SUMMARY:Standup (moved)\r\nDTSTART:20070307T100000Z\r\n"
+                       "RECURRENCE-ID:20070307T090000Z\r\n"))
+      << text;
+  EXPECT_TRUE(contains(text, "RECURRENCE-ID:20070308T090000Z\r\n")) << text;
+}
+
+TEST_F(CalendarsSync, AnOrganizerMissingFromTruthLeavesAnEmptyFileAndTheRunGoesOn) {
+  Json broken = event("ev-broken", "Broken", "2007-03-05T09:00:00");
+  broken["record"]["organizer"] = Json::array({"org-missing"});
+  put({calendar("cal-broken", "Broken", {"ev-broken"}), calendar("cal-fine", "Fine", {"ev-fine"}),
+       broken, event("ev-fine", "Fine", "2007-03-06T09:00:00")});
+  tessel({"calendars", "order", "cal-broken", "cal-fine"});
+
+  const SynctoolRun run = syncClient(kClientID);
+
+  EXPECT_TRUE(run.logContains("Exception while disassembling data:\n")) << run.log;
+  EXPECT_TRUE(fs::exists(calendarsFolder() / "Tessel-Broken.ics"));
+  EXPECT_EQ(fs::file_size(calendarsFolder() / "Tessel-Broken.ics"), 0u);
+  EXPECT_TRUE(contains(calendarFile("Tessel-Fine.ics"), "SUMMARY:Fine\r\n"));
+  EXPECT_EQ(uploadingProgress(run), (std::vector<double>{0, 34, 50.5, 67, 83.5, 100, 100, 100}));
+  // The failure is remembered: the session is cancelled and the run reports an error.
+  EXPECT_EQ(run.finalStatus(), 2) << run.log;
+}
+
+TEST_F(CalendarsSync, AFileThePlayerRefusesEndsTheCalendarsSyncWithAWriteError) {
+  // Longer than a file name may be: the write fails.
+  const std::string title(300, 'x');
+  put({calendar("cal-long", title, {}), calendar("cal-home", "Home", {})});
+  tessel({"calendars", "order", "cal-long", "cal-home"});
+
+  const SynctoolRun run = syncClient(kClientID);
+
+  EXPECT_EQ(run.finalStatus(), 2) << run.log;
+  EXPECT_TRUE(run.logged("Can't write calendar at path " +
+                         (calendarsFolder() / ("Tessel-" + title + ".ics")).string()))
+      << run.log;
+  EXPECT_TRUE(calendarFiles().empty());
+  // The first step is reported before the write, the closing 100 after the failure.
+  EXPECT_EQ(uploadingProgress(run), (std::vector<double>{0, 34, 50.5, 100}));
+}
+
+TEST_F(CalendarsSync, ContactsAndCalendarsSyncTogetherInOneRun) {
+  tessel({"client", "register", std::string(kClientID), "--contacts", "--calendars"});
+  put({record("person", Json{{"tessel.record.entity", "tessel.contacts.Contact"},
+                             {"first name", "Ann"},
+                             {"last name", "Lee"}}),
+       calendar("cal-home", "Home", {"ev-1"}), event("ev-1", "Lunch", "2007-03-15T12:30:00")});
+
+  const SynctoolRun run = syncClient(kClientID);
+
+  EXPECT_EQ(run.finalStatus(), 0) << run.log;
+  EXPECT_TRUE(fs::exists(volume() / "Contacts" / "Tessel.vcf"));
+  EXPECT_TRUE(contains(calendarFile("Tessel-Home.ics"), "SUMMARY:Lunch\r\n"));
+  // Contacts go first; calendars follow in the same session.
+  const auto contacts = run.lineIndex("Sync'ing Contacts");
+  const auto calendars = run.lineIndex("Sync'ing Calendars");
+  ASSERT_TRUE(contacts && calendars) << run.log;
+  EXPECT_LT(*contacts, *calendars);
+}
+
+}  // namespace
+}  // namespace zt::sync::test_support
