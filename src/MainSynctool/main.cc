@@ -1,3 +1,5 @@
-#include "sync/synctool_entry.h"
+#include "MainSynctool/synctool_entry.h"
 
-int main(int argc, char* argv[]) { return zt::sync::synctoolMain(argc, argv); }
+int main(int argc, char* argv[]) {
+  return zt::synctool::synctoolMain(argc, argv);
+}

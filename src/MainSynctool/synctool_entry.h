@@ -1,6 +1,6 @@
 #pragma once
 
-namespace zt::sync {
+namespace zt::synctool {
 
 // The whole program: reads the "DebugLog" default, finds the identifier after "--sync",
 // runs one sync for it and answers the exit status: 0 whenever a sync was attempted,
@@ -11,4 +11,4 @@ int synctoolMain(int argc, const char* const argv[]);
 // Logs the usage line, whether or not debug logging is on.
 void usage();
 
-}  // namespace zt::sync
+}  // namespace zt::synctool

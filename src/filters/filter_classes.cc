@@ -11,9 +11,8 @@ namespace zt::filters {
 
 void registerFilterClasses() {
   tessel::FilterRegistry& registry = tessel::FilterRegistry::shared();
-  registry.registerClass(std::string(ZetoContactFilter::kClassName), [](tessel::Decoder& d) {
-    return std::make_shared<ZetoContactFilter>(d);
-  });
+  registry.registerClass(std::string(ZetoContactFilter::kClassName),
+                         [](tessel::Decoder& d) { return std::make_shared<ZetoContactFilter>(d); });
   registry.registerClass(std::string(ZetoCalendarFilter::kClassName), [](tessel::Decoder& d) {
     return std::make_shared<ZetoCalendarFilter>(d);
   });

@@ -27,8 +27,7 @@ class ZetoCalendarFilter final : public tessel::Filtering {
   bool useAllCalendars() const { return _useAllCalendars; }
   void setUseAllCalendars(bool useAll);
   const tessel::CodedElements& usedCalendarGroups() const { return _usedCalendarGroups; }
-  std::vector<std::string> usedCalendarGroupIDsForSnapshot(
-      const tessel::Snapshot& snapshot) const;
+  std::vector<std::string> usedCalendarGroupIDsForSnapshot(const tessel::Snapshot& snapshot) const;
   void setUsedCalendarGroups(const tessel::CodedElements& calendars);
   void setUsedCalendarGroupIDs(const std::vector<std::string>& identifiers,
                                const tessel::Snapshot& snapshot);

@@ -6,7 +6,8 @@ namespace zt::sync {
 
 // The manager's outcome codes (`_lastStatus`).
 inline constexpr std::int32_t kStatusSuccess = 0;
-inline constexpr std::int32_t kStatusEngineFailure = -8863;  // engine exception, or calendar missing
+inline constexpr std::int32_t kStatusEngineFailure =
+    -8863;  // engine exception, or calendar missing
 inline constexpr std::int32_t kStatusCancelled = -8864;
 inline constexpr std::int32_t kStatusWriteFailed = -8865;
 inline constexpr std::int32_t kStatusDeviceUnavailable = -25176;

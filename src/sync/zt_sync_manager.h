@@ -142,7 +142,6 @@ class ZTSyncManager {
 
 // The device-event callback registered while the manager waits for the volume; the context
 // is the manager. Events of other players and unknown codes change nothing.
-void zetoEventCallback(platform::ZetoRef device, std::int32_t event, void* ignored,
-                       void* context);
+void zetoEventCallback(platform::ZetoRef device, std::int32_t event, void* ignored, void* context);
 
 }  // namespace zt::sync

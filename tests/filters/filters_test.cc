@@ -1,4 +1,5 @@
 #include <gtest/gtest.h>
+#include <unistd.h>
 
 #include <cstdlib>
 #include <filesystem>
@@ -6,8 +7,6 @@
 #include <memory>
 #include <set>
 #include <string>
-
-#include <unistd.h>
 
 #include "filters/filter_classes.h"
 #include "filters/zeto_calendar_filter.h"

@@ -1,10 +1,13 @@
-#include "sync/synctool_entry.h"
+#include "MainSynctool/synctool_entry.h"
 
 #include <cstring>
 #include <memory>
 #include <optional>
 #include <string>
 
+#include "calendars/zt_calendars_syncer.h"
+#include "contacts/zt_contacts_syncer.h"
+#include "device/contact_pictures.h"
 #include "platform/device_library.h"
 #include "platform/file_system.h"
 #include "platform/log.h"
@@ -13,9 +16,12 @@
 #include "platform/user_defaults.h"
 #include "sync/zt_sync_manager.h"
 
-namespace zt::sync {
+namespace zt::synctool {
 
 using platform::Log;
+using sync::SyncerMakers;
+using sync::SyncServices;
+using sync::ZTSyncManager;
 
 namespace {
 
@@ -29,7 +35,9 @@ struct Tool {
 
 }  // namespace
 
-void usage() { Log::always("zetosynctool --oneshot --sync <sync_client_id>"); }
+void usage() {
+  Log::always("zetosynctool --oneshot --sync <sync_client_id>");
+}
 
 int synctoolMain(int argc, const char* const argv[]) {
   Log::setDebugEnabled(platform::UserDefaults::standard().boolForKey("DebugLog").value_or(false));
@@ -54,12 +62,15 @@ int synctoolMain(int argc, const char* const argv[]) {
                         tool->files,
                         platform::RunLoop::current(),
                         tessel::Store::resolvePath(),
-                        SyncerMakers{},
-                        {}};
+                        SyncerMakers{.contacts = contacts::makeContactsSyncer,
+                                     .calendars = calendars::makeCalendarsSyncer},
+                        [](const std::string& volumePath) {
+                          return device::deviceSupportsContactPictures(volumePath);
+                        }};
   tool->manager = std::make_unique<ZTSyncManager>(std::move(*syncClientID), std::move(services));
   tool->manager->doSync();
   Log::debug("Done sync'ing Zeto");
   return 0;
 }
 
-}  // namespace zt::sync
+}  // namespace zt::synctool
