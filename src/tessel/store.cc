@@ -125,14 +125,28 @@ std::int64_t Store::generation() const {
   return query.step() ? query.integer(0) : 0;
 }
 
-std::size_t Store::putRecords(const std::vector<Record>& records) {
-  // Check every record before touching the store.
+namespace {
+
+// The entity of every record, checked before anything is written.
+std::vector<std::string> checkedEntities(const std::vector<Record>& records) {
   std::vector<std::string> entities;
   entities.reserve(records.size());
   for (const Record& record : records) {
     if (record.id.empty()) throw Exception(TesselInvalidRecordException, "empty record identifier");
     entities.push_back(entityOf(record));
   }
+  return entities;
+}
+
+std::size_t tombstoneRecords(detail::Connection& writer,
+                             const std::vector<std::string>& identifiers, MissingRecords missing);
+void writeCalendarOrder(detail::Connection& writer,
+                        const std::vector<std::string>& calendarIdentifiers);
+
+}  // namespace
+
+std::size_t Store::putRecords(const std::vector<Record>& records) {
+  std::vector<std::string> entities = checkedEntities(records);
   detail::Connection& writer = database_->writer();
   detail::WriteTransaction transaction(writer);
   std::size_t written = writeRecords(writer, records, entities);
@@ -140,10 +154,31 @@ std::size_t Store::putRecords(const std::vector<Record>& records) {
   return written;
 }
 
+AppliedChanges Store::applyChanges(const StoreChanges& changes) {
+  std::vector<std::string> entities = checkedEntities(changes.put);
+  detail::Connection& writer = database_->writer();
+  detail::WriteTransaction transaction(writer);
+  AppliedChanges applied;
+  applied.written = writeRecords(writer, changes.put, entities);
+  applied.deleted = tombstoneRecords(writer, changes.remove, MissingRecords::Ignore);
+  if (changes.calendarOrder) writeCalendarOrder(writer, *changes.calendarOrder);
+  transaction.commit();
+  return applied;
+}
+
 std::size_t Store::deleteRecords(const std::vector<std::string>& identifiers,
                                  MissingRecords missing) {
   detail::Connection& writer = database_->writer();
   detail::WriteTransaction transaction(writer);
+  std::size_t deleted = tombstoneRecords(writer, identifiers, missing);
+  transaction.commit();
+  return deleted;
+}
+
+namespace {
+
+std::size_t tombstoneRecords(detail::Connection& writer,
+                             const std::vector<std::string>& identifiers, MissingRecords missing) {
   GenerationCounter generation(writer);
   auto& tombstone = writer.cached(
       "UPDATE records SET deleted = 1, data = NULL, generation = ? WHERE id = ? AND deleted = 0");
@@ -160,9 +195,10 @@ std::size_t Store::deleteRecords(const std::vector<std::string>& identifiers,
     }
   }
   generation.save();
-  transaction.commit();
   return deleted;
 }
+
+}  // namespace
 
 std::optional<Dictionary> Store::record(std::string_view identifier) const {
   auto& query = database_->writer().cached("SELECT data FROM records WHERE id = ? AND deleted = 0");
@@ -203,6 +239,14 @@ void Store::setCalendarOrder(const std::vector<std::string>& calendarIdentifiers
   detail::Connection& writer = database_->writer();
   // One transaction for the check and the write, so no calendar vanishes in between.
   detail::WriteTransaction transaction(writer);
+  writeCalendarOrder(writer, calendarIdentifiers);
+  transaction.commit();
+}
+
+namespace {
+
+void writeCalendarOrder(detail::Connection& writer,
+                        const std::vector<std::string>& calendarIdentifiers) {
   auto& calendar = writer.cached("SELECT entity FROM records WHERE id = ? AND deleted = 0");
   zt::platform::Array order;
   for (const std::string& identifier : calendarIdentifiers) {
@@ -226,8 +270,9 @@ void Store::setCalendarOrder(const std::vector<std::string>& calendarIdentifiers
       {std::string(TesselRelationship_Calendars_CalendarOrder_Calendars), Value(std::move(order))}};
   std::vector<Record> records{Record{identifier, std::move(record)}};
   writeRecords(writer, records, {std::string(TesselEntity_Calendars_CalendarOrder)});
-  transaction.commit();
 }
+
+}  // namespace
 
 std::unique_ptr<Client> Store::registerClient(std::string_view identifier,
                                               std::string_view displayName,

@@ -22,6 +22,19 @@ class Database;
 }
 
 enum class StoreOpening { CreateIfMissing, MustExist };
+
+// Writes that belong together, applied by Store::applyChanges in one transaction: records put,
+// then records deleted (unknown identifiers are ignored), then the calendar order replaced.
+struct StoreChanges {
+  std::vector<Record> put;
+  std::vector<std::string> remove;
+  std::optional<std::vector<std::string>> calendarOrder;
+};
+
+struct AppliedChanges {
+  std::size_t written = 0;
+  std::size_t deleted = 0;
+};
 enum class MissingRecords { Ignore, Fail };
 
 // The engine's store: one SQLite file holding truth, clients, their mirrors and sessions.
@@ -58,6 +71,10 @@ class Store {
   void forEachRecord(const std::function<void(const Record&)>& visit,
                      std::optional<std::string_view> entityName = std::nullopt) const;
   std::size_t recordCount(std::optional<std::string_view> entityName = std::nullopt) const;
+
+  // Importers' writes: everything or nothing, so an interrupted import leaves no half state.
+  // Raises as putRecords and setCalendarOrder do, and then nothing is written.
+  AppliedChanges applyChanges(const StoreChanges& changes);
 
   // Writes the single CalendarOrder record with these calendar identifiers in this order.
   // Every identifier must be a live calendar (TesselUnknownRecordException).

@@ -155,6 +155,31 @@ TEST_F(StoreRecords, TheCalendarOrderIsOneRecordThatNamesLiveCalendarsOnly) {
   EXPECT_THROW(store_->setCalendarOrder({"k1", "nope"}), Exception);
 }
 
+TEST_F(StoreRecords, ChangesAppliedTogetherLandTogetherOrNotAtAll) {
+  auto calendar = [](std::string id) {
+    return Record{
+        id, Dictionary{{std::string(TesselRecordEntityNameKey), TesselEntity_Calendars_Calendar},
+                       {"title", id}}};
+  };
+  store_->putRecords({calendar("old")});
+  std::int64_t before = store_->generation();
+
+  // An order that names no calendar fails the whole batch: the puts and deletes before it
+  // are rolled back with it.
+  EXPECT_THROW(store_->applyChanges({{calendar("new")}, {"old"}, std::vector<std::string>{"x"}}),
+               Exception);
+  EXPECT_EQ(store_->generation(), before);
+  EXPECT_TRUE(store_->record("old"));
+  EXPECT_FALSE(store_->record("new"));
+
+  AppliedChanges applied = store_->applyChanges(
+      {{calendar("new")}, {"old", "never-there"}, std::vector{std::string("new")}});
+  EXPECT_EQ(applied.written, 1u);
+  EXPECT_EQ(applied.deleted, 1u);
+  EXPECT_FALSE(store_->record("old"));
+  EXPECT_EQ(store_->recordCount(TesselEntity_Calendars_CalendarOrder), 1u);
+}
+
 using StoreClients = StoreTest;
 
 TEST_F(StoreClients, SettingsKeepTheirTypeAndSurviveAReopen) {

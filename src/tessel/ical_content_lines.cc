@@ -1,0 +1,204 @@
+#include "tessel/ical_content_lines.h"
+
+#include <optional>
+#include <utility>
+
+#include "tessel/ical_error.h"
+
+namespace tessel {
+
+namespace {
+
+// Deeper nesting than any real calendar uses (VCALENDAR > VEVENT > VALARM, or VTIMEZONE >
+// STANDARD) is refused before libical, whose parser and destructor recurse, ever sees it.
+constexpr std::size_t kMaximumDepth = 8;
+
+std::string upperCased(std::string_view text) {
+  std::string upper(text);
+  for (char& c : upper) {
+    if (c >= 'a' && c <= 'z') c = static_cast<char>(c - 'a' + 'A');
+  }
+  return upper;
+}
+
+std::string_view trimmed(std::string_view text) {
+  while (!text.empty() && (text.front() == ' ' || text.front() == '\t')) text.remove_prefix(1);
+  while (!text.empty() && (text.back() == ' ' || text.back() == '\t')) text.remove_suffix(1);
+  return text;
+}
+
+bool isNameCharacter(char c) {
+  return (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z') || (c >= '0' && c <= '9') || c == '-';
+}
+
+// The length of the UTF-8 sequence that starts at `i`, or 0 when the bytes there are not
+// UTF-8 (overlong forms, surrogates and code points past U+10FFFF included).
+std::size_t utf8SequenceLength(std::string_view text, std::size_t i) {
+  const auto byte = [&](std::size_t k) { return static_cast<unsigned char>(text[k]); };
+  const unsigned char lead = byte(i);
+  if (lead < 0x80) return 1;
+  std::size_t length = 0;
+  unsigned char low = 0x80, high = 0xBF;
+  if (lead >= 0xC2 && lead <= 0xDF) {
+    length = 2;
+  } else if (lead >= 0xE0 && lead <= 0xEF) {
+    length = 3;
+    if (lead == 0xE0) low = 0xA0;
+    if (lead == 0xED) high = 0x9F;
+  } else if (lead >= 0xF0 && lead <= 0xF4) {
+    length = 4;
+    if (lead == 0xF0) low = 0x90;
+    if (lead == 0xF4) high = 0x8F;
+  } else {
+    return 0;
+  }
+  if (i + length > text.size()) return 0;
+  if (byte(i + 1) < low || byte(i + 1) > high) return 0;
+  for (std::size_t k = 2; k < length; ++k) {
+    if (byte(i + k) < 0x80 || byte(i + k) > 0xBF) return 0;
+  }
+  return length;
+}
+
+struct PhysicalLine {
+  std::size_t number;
+  std::string_view text;
+};
+
+// RFC 5545 section 3.1 ends lines with CR LF; files that went through Unix tools end them
+// with LF, and old Mac programs with CR. All three end a line here, so that no CR is left
+// inside a line for libical to read as a line end of its own.
+std::vector<PhysicalLine> physicalLines(std::string_view text) {
+  std::vector<PhysicalLine> lines;
+  std::size_t number = 1;
+  std::size_t start = 0;
+  for (std::size_t i = 0; i < text.size(); ++i) {
+    if (text[i] != '\n' && text[i] != '\r') continue;
+    lines.push_back({number++, text.substr(start, i - start)});
+    if (text[i] == '\r' && i + 1 < text.size() && text[i + 1] == '\n') ++i;
+    start = i + 1;
+  }
+  if (start < text.size()) lines.push_back({number, text.substr(start)});
+  return lines;
+}
+
+// Where the value starts: after the first colon that is not inside a quoted parameter value
+// (RFC 5545 section 3.2 lets quoted values hold ":" and ";").
+std::optional<std::size_t> valueStart(std::string_view line, std::size_t nameEnd) {
+  bool quoted = false;
+  for (std::size_t i = nameEnd; i < line.size(); ++i) {
+    if (line[i] == '"') {
+      quoted = !quoted;
+    } else if (line[i] == ':' && !quoted) {
+      return i + 1;
+    }
+  }
+  return std::nullopt;
+}
+
+}  // namespace
+
+std::vector<ICalContentLine> readICalContentLines(std::string_view text,
+                                                  const std::string& source) {
+  const auto fail = [&](std::size_t line, std::string reason) -> ICalError {
+    return ICalError(source, line, std::move(reason));
+  };
+
+  // A byte order mark is not part of the text (some Windows programs write one).
+  if (text.substr(0, 3) == "\xEF\xBB\xBF") text.remove_prefix(3);
+
+  const std::vector<PhysicalLine> physical = physicalLines(text);
+
+  // Unfold: a line that starts with a space or a tab continues the one before, without that
+  // first character.
+  struct Logical {
+    std::size_t number;
+    std::string text;
+  };
+  std::vector<Logical> logical;
+  for (const PhysicalLine& line : physical) {
+    if (!line.text.empty() && (line.text.front() == ' ' || line.text.front() == '\t')) {
+      if (logical.empty()) throw fail(line.number, "a folded line continues nothing");
+      logical.back().text.append(line.text.substr(1));
+      continue;
+    }
+    logical.push_back({line.number, std::string(line.text)});
+  }
+
+  struct Open {
+    std::string name;
+    std::size_t line;
+  };
+  std::vector<Open> open;
+  std::vector<ICalContentLine> lines;
+  bool sawCalendar = false;
+  for (Logical& line : logical) {
+    const std::string_view content = line.text;
+    // RFC 5545 section 3.1.4: the text is UTF-8. It is checked after unfolding, because
+    // section 3.1 lets a fold fall inside a multi-octet character.
+    for (std::size_t i = 0; i < content.size();) {
+      if (content[i] == '\0') throw fail(line.number, "a NUL byte is not iCalendar text");
+      const std::size_t length = utf8SequenceLength(content, i);
+      if (length == 0) throw fail(line.number, "the text is not UTF-8");
+      i += length;
+    }
+    if (trimmed(content).empty()) continue;
+    std::size_t nameEnd = 0;
+    while (nameEnd < content.size() && isNameCharacter(content[nameEnd])) ++nameEnd;
+    if (nameEnd == 0 || nameEnd == content.size() ||
+        (content[nameEnd] != ':' && content[nameEnd] != ';')) {
+      throw fail(line.number, "not an iCalendar content line (NAME:value)");
+    }
+    const std::optional<std::size_t> value = valueStart(content, nameEnd);
+    if (!value) throw fail(line.number, "no ':' before the value");
+    const std::string name = upperCased(content.substr(0, nameEnd));
+
+    if (name == "BEGIN" || name == "END") {
+      const std::string component = upperCased(trimmed(content.substr(*value)));
+      if (component.empty()) throw fail(line.number, name + " names no component");
+      if (name == "BEGIN") {
+        if (open.empty() && component != "VCALENDAR") {
+          throw fail(line.number, "BEGIN:" + component + " outside BEGIN:VCALENDAR");
+        }
+        if (!open.empty() && component == "VCALENDAR") {
+          throw fail(line.number, "BEGIN:VCALENDAR inside BEGIN:" + open.back().name);
+        }
+        if (open.size() == kMaximumDepth) throw fail(line.number, "components nest too deeply");
+        sawCalendar = true;
+        open.push_back({component, line.number});
+        lines.push_back({ICalContentLine::Kind::Begin, line.number, component, {}});
+      } else {
+        if (open.empty()) throw fail(line.number, "END:" + component + " without its BEGIN");
+        if (open.back().name != component) {
+          throw fail(line.number, "END:" + component + " where BEGIN:" + open.back().name +
+                                      " of line " + std::to_string(open.back().line) +
+                                      " is still open");
+        }
+        open.pop_back();
+        lines.push_back({ICalContentLine::Kind::End, line.number, component, {}});
+      }
+      continue;
+    }
+
+    if (open.empty()) throw fail(line.number, name + " outside BEGIN:VCALENDAR");
+    // Diagnostics that libical wrote into a file it exported once are not data.
+    if (name == "X-LIC-ERROR") continue;
+    // Exporters write empty values ("DESCRIPTION:") for fields the user left blank; they
+    // say nothing, and libical would refuse them.
+    if (trimmed(content.substr(*value)).empty()) continue;
+    std::string written(content.substr(0, nameEnd));
+    lines.push_back(
+        {ICalContentLine::Kind::Property, line.number, std::move(written), std::move(line.text)});
+  }
+  if (!open.empty()) {
+    throw fail(open.back().line,
+               "BEGIN:" + open.back().name + " is never closed by END:" + open.back().name);
+  }
+  if (!sawCalendar) {
+    throw fail(logical.empty() ? 1 : logical.front().number,
+               "no BEGIN:VCALENDAR: this is not an iCalendar file");
+  }
+  return lines;
+}
+
+}  // namespace tessel

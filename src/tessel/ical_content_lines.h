@@ -1,0 +1,31 @@
+#pragma once
+
+#include <cstddef>
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace tessel {
+
+// One content line of an iCalendar file after unfolding, with the 1-based line of the file on
+// which it starts, so that every later message can point at the line the user sees.
+struct ICalContentLine {
+  enum class Kind { Begin, End, Property };
+
+  Kind kind = Kind::Property;
+  std::size_t line = 0;
+  // Begin and End: the component name in upper case ("VEVENT"). Property: the property
+  // name as written.
+  std::string name;
+  // Property: the whole unfolded line as written. Begin and End: empty.
+  std::string text;
+};
+
+// Reads the text of one iCalendar file into its content lines: checks that it is UTF-8,
+// unfolds it (RFC 5545 section 3.1), and checks that its components nest as BEGIN and END
+// say, inside VCALENDAR objects. Lines that hold nothing (blank lines, properties with an
+// empty value, libical's own X-LIC-ERROR remarks) are left out. Raises ICalError naming
+// `source` and the line of the first fault.
+std::vector<ICalContentLine> readICalContentLines(std::string_view text, const std::string& source);
+
+}  // namespace tessel

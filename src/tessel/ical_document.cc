@@ -1,0 +1,204 @@
+#include "tessel/ical_document.h"
+
+#include <libical/ical.h>
+
+#include <charconv>
+#include <cstdlib>
+#include <memory>
+
+#include "tessel/ical_content_lines.h"
+
+namespace tessel {
+
+namespace {
+
+// The parameter (on properties) and the property (first in each component) through which
+// the importer hands line numbers through libical. Input that uses these names itself has
+// them replaced: they are never data.
+constexpr const char* kLineName = "X-TESSEL-IMPORT-LINE";
+
+struct FreeText {
+  void operator()(char* text) const { std::free(text); }
+};
+using OwnedText = std::unique_ptr<char, FreeText>;
+
+struct FreeComponent {
+  void operator()(icalcomponent* component) const { icalcomponent_free(component); }
+};
+using OwnedComponent = std::unique_ptr<icalcomponent, FreeComponent>;
+
+std::optional<std::size_t> parseLineNumber(const char* text) {
+  if (text == nullptr) return std::nullopt;
+  const std::string_view digits(text);
+  std::size_t number = 0;
+  auto [end, error] = std::from_chars(digits.data(), digits.data() + digits.size(), number);
+  if (error != std::errc() || end != digits.data() + digits.size()) return std::nullopt;
+  return number;
+}
+
+// The text of the first X-LIC-ERROR that libical added to `component` or anything inside it,
+// with the component it was found in.
+icalproperty* firstError(icalcomponent* component, icalcomponent** where) {
+  if (icalproperty* error = icalcomponent_get_first_property(component, ICAL_XLICERROR_PROPERTY)) {
+    *where = component;
+    return error;
+  }
+  for (icalcompiter it = icalcomponent_begin_component(component, ICAL_ANY_COMPONENT);
+       icalcompiter_deref(&it) != nullptr; icalcompiter_next(&it)) {
+    if (icalproperty* error = firstError(icalcompiter_deref(&it), where)) return error;
+  }
+  return nullptr;
+}
+
+std::string errorText(icalproperty* error) {
+  const char* text = icalproperty_get_xlicerror(error);
+  if (text == nullptr || *text == '\0') return "libical refused it";
+  // libical says what it does with a property it cannot read; here the whole file is
+  // refused instead.
+  std::string message(text);
+  constexpr std::string_view kRemoving = ". Removing entire property";
+  if (const std::size_t at = message.find(kRemoving); at != std::string::npos) {
+    message.erase(at, kRemoving.size());
+  }
+  return message;
+}
+
+// Parses one content line inside an empty VCALENDAR, the way libical reads it in the whole
+// file, and answers libical's complaint about it, if any.
+std::optional<std::string> complaintAbout(const std::string& line) {
+  const std::string text = "BEGIN:VCALENDAR\r\n" + line + "\r\nEND:VCALENDAR\r\n";
+  OwnedComponent calendar(icalparser_parse_string(text.c_str()));
+  if (!calendar) return std::string("libical cannot read it");
+  icalcomponent* where = nullptr;
+  if (icalproperty* error = firstError(calendar.get(), &where)) return errorText(error);
+  return std::nullopt;
+}
+
+// The line as libical gets it: with the line number as a parameter right after the name, so
+// that it stays with the property (also when libical splits one line of several values, such
+// as "EXDATE:a,b", into several properties).
+std::string taggedLine(const ICalContentLine& line) {
+  std::string tagged = line.name;
+  tagged += ';';
+  tagged += kLineName;
+  tagged += '=';
+  tagged += std::to_string(line.line);
+  tagged.append(line.text, line.name.size());
+  return tagged;
+}
+
+bool isLineTag(const std::string& name) {
+  std::string upper = name;
+  for (char& c : upper) {
+    if (c >= 'a' && c <= 'z') c = static_cast<char>(c - 'a' + 'A');
+  }
+  return upper == kLineName;
+}
+
+}  // namespace
+
+ICalDocument ICalDocument::parse(std::string_view text, std::string source) {
+  // A libical built with ICAL_ERRORS_ARE_FATAL aborts on the first value it cannot read;
+  // here such a value is a fault to report with its line.
+  icalerror_set_errors_are_fatal(0);
+  const std::vector<ICalContentLine> lines = readICalContentLines(text, source);
+
+  std::string tagged;
+  tagged.reserve(text.size() + lines.size() * 32);
+  for (const ICalContentLine& line : lines) {
+    switch (line.kind) {
+      case ICalContentLine::Kind::Begin:
+        tagged += "BEGIN:" + line.name + "\r\n";
+        tagged += std::string(kLineName) + ':' + std::to_string(line.line) + "\r\n";
+        break;
+      case ICalContentLine::Kind::End:
+        tagged += "END:" + line.name + "\r\n";
+        break;
+      case ICalContentLine::Kind::Property:
+        if (isLineTag(line.name)) break;
+        if (std::optional<std::string> complaint = complaintAbout(line.text)) {
+          throw ICalError(source, line.line, line.name + ": " + *complaint);
+        }
+        tagged += taggedLine(line) + "\r\n";
+        break;
+    }
+  }
+
+  OwnedComponent root(icalparser_parse_string(tagged.c_str()));
+  if (!root) throw ICalError(source, 1, "libical cannot read this file");
+  // Every line passed on its own; whatever libical still finds wrong is reported at the
+  // component it concerns.
+  icalcomponent* where = nullptr;
+  if (icalproperty* error = firstError(root.get(), &where)) {
+    throw ICalError(source, lineOf(where), errorText(error));
+  }
+  const icalcomponent_kind kind = icalcomponent_isa(root.get());
+  if (kind != ICAL_VCALENDAR_COMPONENT && kind != ICAL_XROOT_COMPONENT) {
+    throw ICalError(source, lineOf(root.get()), "no VCALENDAR in this file");
+  }
+  return ICalDocument(root.release(), std::move(source));
+}
+
+ICalDocument::ICalDocument(ICalDocument&& other) noexcept
+    : root_(std::exchange(other.root_, nullptr)), source_(std::move(other.source_)) {}
+
+ICalDocument& ICalDocument::operator=(ICalDocument&& other) noexcept {
+  if (this != &other) {
+    if (root_ != nullptr) icalcomponent_free(root_);
+    root_ = std::exchange(other.root_, nullptr);
+    source_ = std::move(other.source_);
+  }
+  return *this;
+}
+
+ICalDocument::~ICalDocument() {
+  if (root_ != nullptr) icalcomponent_free(root_);
+}
+
+std::vector<icalcomponent*> ICalDocument::calendars() const {
+  std::vector<icalcomponent*> calendars;
+  if (icalcomponent_isa(root_) == ICAL_VCALENDAR_COMPONENT) {
+    calendars.push_back(root_);
+    return calendars;
+  }
+  for (icalcompiter it = icalcomponent_begin_component(root_, ICAL_VCALENDAR_COMPONENT);
+       icalcompiter_deref(&it) != nullptr; icalcompiter_next(&it)) {
+    calendars.push_back(icalcompiter_deref(&it));
+  }
+  return calendars;
+}
+
+std::optional<std::size_t> ICalDocument::lineOf(icalproperty* property) {
+  if (property == nullptr) return std::nullopt;
+  for (icalparameter* parameter = icalproperty_get_first_parameter(property, ICAL_X_PARAMETER);
+       parameter != nullptr;
+       parameter = icalproperty_get_next_parameter(property, ICAL_X_PARAMETER)) {
+    const char* name = icalparameter_get_xname(parameter);
+    if (name != nullptr && std::string_view(name) == kLineName) {
+      return parseLineNumber(icalparameter_get_xvalue(parameter));
+    }
+  }
+  return std::nullopt;
+}
+
+std::optional<std::size_t> ICalDocument::lineOf(icalcomponent* component) {
+  if (component == nullptr) return std::nullopt;
+  for (icalproperty* property = icalcomponent_get_first_property(component, ICAL_X_PROPERTY);
+       property != nullptr;
+       property = icalcomponent_get_next_property(component, ICAL_X_PROPERTY)) {
+    const char* name = icalproperty_get_x_name(property);
+    if (name != nullptr && std::string_view(name) == kLineName) {
+      return parseLineNumber(icalproperty_get_x(property));
+    }
+  }
+  return std::nullopt;
+}
+
+ICalError ICalDocument::errorAt(icalproperty* property, icalcomponent* component,
+                                std::string reason) const {
+  std::optional<std::size_t> line = lineOf(property);
+  if (!line) line = lineOf(component);
+  return ICalError(source_, line, std::move(reason));
+}
+
+}  // namespace tessel

@@ -1,0 +1,53 @@
+#pragma once
+
+#include <cstddef>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+#include "tessel/ical_error.h"
+
+// libical's types, declared here so that only the importer's sources include libical.
+struct icalcomponent_impl;
+struct icalproperty_impl;
+
+namespace tessel {
+
+// One iCalendar file parsed by libical, after every content line was checked on its own so
+// that a fault is reported with its line. Each property and component remembers the line it
+// came from (lineOf), for the messages of later checks.
+class ICalDocument {
+ public:
+  // Raises ICalError naming `source` and the line of the first fault.
+  static ICalDocument parse(std::string_view text, std::string source);
+
+  ICalDocument(ICalDocument&& other) noexcept;
+  ICalDocument& operator=(ICalDocument&& other) noexcept;
+  ICalDocument(const ICalDocument&) = delete;
+  ICalDocument& operator=(const ICalDocument&) = delete;
+  ~ICalDocument();
+
+  const std::string& source() const { return source_; }
+  // The VCALENDAR objects of the file, in file order (a file may hold more than one).
+  std::vector<icalcomponent_impl*> calendars() const;
+
+  // The line a property or component starts on; none for what libical made up itself.
+  static std::optional<std::size_t> lineOf(icalproperty_impl* property);
+  static std::optional<std::size_t> lineOf(icalcomponent_impl* component);
+
+  // An ICalError about this file at the line of `property` (or of `component` when the
+  // property is null).
+  ICalError errorAt(icalproperty_impl* property, icalcomponent_impl* component,
+                    std::string reason) const;
+
+ private:
+  ICalDocument(icalcomponent_impl* root, std::string source)
+      : root_(root), source_(std::move(source)) {}
+
+  icalcomponent_impl* root_ = nullptr;
+  std::string source_;
+};
+
+}  // namespace tessel

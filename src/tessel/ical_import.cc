@@ -1,0 +1,241 @@
+#include "tessel/ical_import.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdint>
+#include <cstring>
+#include <fstream>
+#include <map>
+#include <set>
+#include <sstream>
+#include <system_error>
+
+#include "platform/value.h"
+#include "tessel/schema.h"
+
+namespace tessel {
+
+namespace fs = std::filesystem;
+
+namespace {
+
+using zt::platform::Array;
+using zt::platform::Dictionary;
+using zt::platform::Value;
+
+std::string lowerCased(std::string text) {
+  for (char& c : text) {
+    if (c >= 'A' && c <= 'Z') c = static_cast<char>(c - 'A' + 'a');
+  }
+  return text;
+}
+
+std::string readText(const fs::path& path, const std::string& name) {
+  std::ifstream in(path, std::ios::binary);
+  if (!in) throw ICalError(name, std::nullopt, std::string("cannot read: ") + std::strerror(errno));
+  std::ostringstream text;
+  text << in.rdbuf();
+  if (in.bad()) throw ICalError(name, std::nullopt, "cannot read");
+  return std::move(text).str();
+}
+
+// The vdir format keeps a collection's name in a file "displayname" inside the folder.
+std::optional<std::string> vdirDisplayName(const fs::path& folder) {
+  std::error_code error;
+  const fs::path file = folder / "displayname";
+  if (!fs::is_regular_file(file, error)) return std::nullopt;
+  std::ifstream in(file, std::ios::binary);
+  std::string line;
+  if (!std::getline(in, line)) return std::nullopt;
+  while (!line.empty() && (line.back() == '\r' || line.back() == ' ')) line.pop_back();
+  if (line.empty()) return std::nullopt;
+  return line;
+}
+
+ICalCalendarSource folderSource(const fs::path& folder, const std::string& name,
+                                const std::optional<std::string>& title) {
+  ICalCalendarSource source;
+  source.identifier = calendarIdentifierForPath(folder);
+  std::vector<fs::path> files;
+  std::error_code error;
+  for (fs::directory_iterator it(folder, error), end; !error && it != end; it.increment(error)) {
+    if (!it->is_regular_file(error)) continue;
+    if (lowerCased(it->path().extension().string()) == ".ics") files.push_back(it->path());
+  }
+  if (error) throw ICalError(name, std::nullopt, "cannot list the folder: " + error.message());
+  // Folder order is the file system's; file names give a stable one.
+  std::sort(files.begin(), files.end());
+  for (const fs::path& file : files) {
+    const std::string fileName = (fs::path(name) / file.filename()).string();
+    source.files.push_back({fileName, readText(file, fileName)});
+  }
+  fs::path named = fs::canonical(folder, error);
+  if (error) named = folder;
+  source.title = vdirDisplayName(folder);
+  if (!source.title) source.title = title ? *title : named.filename().string();
+  return source;
+}
+
+ICalCalendarSource fileSource(const fs::path& file, const std::string& name,
+                              const std::optional<std::string>& title) {
+  ICalCalendarSource source;
+  source.identifier = calendarIdentifierForPath(file);
+  source.files.push_back({name, readText(file, name)});
+  source.fallbackTitle = title ? *title : file.stem().string();
+  return source;
+}
+
+std::string calendarOf(const std::string& identifier) {
+  return identifier.substr(0, identifier.find('/'));
+}
+
+const Array* arrayAt(const Dictionary& record, std::string_view key) {
+  const Value* value = record.find(key);
+  return value != nullptr ? value->asArray() : nullptr;
+}
+
+void appendStrings(const Array* array, std::vector<std::string>& out) {
+  if (array == nullptr) return;
+  for (const Value& value : *array) {
+    if (const std::string* text = value.asString()) out.push_back(*text);
+  }
+}
+
+// The relationships through which an event or task lists records of its own.
+constexpr std::string_view kOwnedRelationships[] = {
+    TesselRelationship_Calendars_Event_Recurrences,
+    TesselRelationship_Calendars_Event_AudioAlarms,
+    TesselRelationship_Calendars_Event_MailAlarms,
+    TesselRelationship_Calendars_Event_DisplayAlarms,
+    TesselRelationship_Calendars_Event_Organizer,
+    TesselRelationship_Calendars_Event_Attendees,
+    TesselRelationship_Calendars_Event_DetachedEvents,
+};
+
+}  // namespace
+
+std::string calendarIdentifierForPath(const fs::path& path) {
+  std::error_code error;
+  fs::path absolute = fs::canonical(path, error);
+  if (error) absolute = fs::absolute(path, error).lexically_normal();
+  std::uint64_t hash = 0xcbf29ce484222325ULL;  // FNV-1a
+  for (char c : absolute.string()) {
+    hash ^= static_cast<unsigned char>(c);
+    hash *= 0x100000001b3ULL;
+  }
+  static constexpr char kHex[] = "0123456789abcdef";
+  std::string identifier = "ical-0000000000000000";
+  for (std::size_t i = identifier.size(); i-- > 5; hash >>= 4) identifier[i] = kHex[hash & 0xF];
+  return identifier;
+}
+
+std::vector<ICalCalendar> readICalendarPaths(const std::vector<fs::path>& paths,
+                                             const std::optional<std::string>& title) {
+  std::vector<ICalCalendar> calendars;
+  std::set<std::string> seen;
+  for (const fs::path& path : paths) {
+    const std::string name = path.string();
+    std::error_code error;
+    const fs::file_status status = fs::status(path, error);
+    ICalCalendarSource source;
+    if (fs::is_directory(status)) {
+      source = folderSource(path, name, title);
+    } else if (fs::is_regular_file(status)) {
+      source = fileSource(path, name, title);
+    } else {
+      throw ICalError(name, std::nullopt, "no such file or folder");
+    }
+    // The same calendar named twice is imported once.
+    if (!seen.insert(source.identifier).second) continue;
+    calendars.push_back(readICalCalendar(source));
+  }
+  return calendars;
+}
+
+ICalImportCounts writeICalCalendars(Store& store, const std::vector<ICalCalendar>& calendars,
+                                    SyncDeletes syncDeletes) {
+  // What the store holds of these calendars now, by calendar.
+  std::map<std::string, RecordMap> stored;
+  for (const ICalCalendar& calendar : calendars) stored[calendar.identifier];
+  std::set<std::string> liveCalendars;
+  std::vector<std::string> order;
+  store.forEachRecord([&](const Record& record) {
+    const Value* entity = record.record.find(TesselRecordEntityNameKey);
+    const std::string* name = entity != nullptr ? entity->asString() : nullptr;
+    if (name != nullptr && *name == TesselEntity_Calendars_Calendar)
+      liveCalendars.insert(record.id);
+    if (name != nullptr && *name == TesselEntity_Calendars_CalendarOrder && order.empty()) {
+      appendStrings(arrayAt(record.record, TesselRelationship_Calendars_CalendarOrder_Calendars),
+                    order);
+    }
+    const auto found = stored.find(calendarOf(record.id));
+    if (found != stored.end() && record.id.size() > found->first.size()) {
+      found->second.emplace(record.id, record.record);
+    }
+  });
+
+  std::vector<Record> records;
+  std::vector<std::string> stale;
+  for (const ICalCalendar& calendar : calendars) {
+    const RecordMap& before = stored[calendar.identifier];
+    std::set<std::string> produced;
+    for (const Record& record : calendar.records) produced.insert(record.id);
+
+    std::vector<Record> written = calendar.records;
+    std::set<std::string> kept;
+    if (syncDeletes == SyncDeletes::Off) {
+      // Events and tasks that left the source stay, listed in their calendar as before, and
+      // so do the records they list.
+      std::vector<std::string> keptEvents, keptTasks;
+      for (const auto& [id, record] : before) {
+        const Value* entity = record.find(TesselRecordEntityNameKey);
+        const std::string* name = entity != nullptr ? entity->asString() : nullptr;
+        if (name == nullptr || produced.count(id) != 0) continue;
+        const bool event = *name == TesselEntity_Calendars_Event;
+        if (!event && *name != TesselEntity_Calendars_Task) continue;
+        (event ? keptEvents : keptTasks).push_back(id);
+        kept.insert(id);
+        std::vector<std::string> owned;
+        for (std::string_view key : kOwnedRelationships) appendStrings(arrayAt(record, key), owned);
+        kept.insert(owned.begin(), owned.end());
+      }
+      Dictionary& calendarRecord = written.front().record;
+      const auto extend = [&](std::string_view key, const std::vector<std::string>& ids) {
+        if (ids.empty()) return;
+        Array list = *arrayAt(calendarRecord, key);
+        for (const std::string& id : ids) list.emplace_back(id);
+        calendarRecord.set(key, Value(std::move(list)));
+      };
+      extend(TesselRelationship_Calendars_Calendar_Events, keptEvents);
+      extend(TesselRelationship_Calendars_Calendar_Tasks, keptTasks);
+    }
+    for (const auto& [id, record] : before) {
+      if (produced.count(id) == 0 && kept.count(id) == 0) stale.push_back(id);
+    }
+    for (Record& record : written) records.push_back(std::move(record));
+  }
+
+  // The order keeps the calendars it lists that still exist, then the new ones.
+  std::vector<std::string> newOrder;
+  for (const ICalCalendar& calendar : calendars) liveCalendars.insert(calendar.identifier);
+  for (const std::string& id : order) {
+    if (liveCalendars.count(id) != 0 &&
+        std::find(newOrder.begin(), newOrder.end(), id) == newOrder.end()) {
+      newOrder.push_back(id);
+    }
+  }
+  for (const ICalCalendar& calendar : calendars) {
+    if (std::find(newOrder.begin(), newOrder.end(), calendar.identifier) == newOrder.end()) {
+      newOrder.push_back(calendar.identifier);
+    }
+  }
+
+  // One transaction: an interrupted import leaves the store as it was.
+  AppliedChanges applied = store.applyChanges(StoreChanges{records, stale, newOrder});
+  ICalImportCounts counts;
+  counts.written = applied.written;
+  counts.deleted = applied.deleted;
+  return counts;
+}
+
+}  // namespace tessel

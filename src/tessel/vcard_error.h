@@ -1,0 +1,28 @@
+#pragma once
+
+#include <cstddef>
+#include <optional>
+#include <stdexcept>
+#include <string>
+
+namespace tessel {
+
+// What is wrong with a vCard input, and where: the file (or the name the text was given)
+// and the 1-based line on which the faulty property or card starts. Its text reads
+// "contacts.vcf: line 12: bad base64 in PHOTO".
+class VCardError : public std::runtime_error {
+ public:
+  VCardError(std::string source, std::optional<std::size_t> line, std::string reason);
+
+  const std::string& source() const { return source_; }
+  // Absent when the fault is the file as a whole (it cannot be read).
+  std::optional<std::size_t> line() const { return line_; }
+  const std::string& reason() const { return reason_; }
+
+ private:
+  std::string source_;
+  std::optional<std::size_t> line_;
+  std::string reason_;
+};
+
+}  // namespace tessel

@@ -1,0 +1,257 @@
+#include "tessel/vcard_import.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <fstream>
+#include <set>
+#include <sstream>
+#include <system_error>
+#include <unordered_set>
+#include <utility>
+
+#include "tessel/schema.h"
+#include "tessel/vcard_decoding.h"
+#include "tessel/vcard_error.h"
+#include "tessel/vcard_identifiers.h"
+#include "tessel/vcard_reader.h"
+
+namespace tessel {
+
+namespace {
+
+using zt::platform::Array;
+using zt::platform::Dictionary;
+using zt::platform::Value;
+
+namespace fs = std::filesystem;
+
+std::string readFile(const fs::path& file) {
+  std::error_code error;
+  if (fs::is_directory(file, error)) {
+    throw VCardError(file.string(), std::nullopt, "cannot read: it is a folder");
+  }
+  std::ifstream in(file, std::ios::binary);
+  if (!in) {
+    throw VCardError(file.string(), std::nullopt,
+                     std::string("cannot read: ") + std::strerror(errno));
+  }
+  std::ostringstream text;
+  text << in.rdbuf();
+  if (in.bad()) throw VCardError(file.string(), std::nullopt, "cannot read");
+  return std::move(text).str();
+}
+
+Array identifierArray(const std::vector<std::string>& identifiers) {
+  return Array(identifiers.begin(), identifiers.end());
+}
+
+std::vector<std::string> stringsOf(const Value* value) {
+  std::vector<std::string> strings;
+  const Array* array = value != nullptr ? value->asArray() : nullptr;
+  if (array == nullptr) return strings;
+  for (const Value& element : *array) {
+    if (const std::string* text = element.asString()) strings.push_back(*text);
+  }
+  return strings;
+}
+
+}  // namespace
+
+void VCardImport::addPaths(const std::vector<fs::path>& paths) {
+  for (const fs::path& path : paths) {
+    std::error_code error;
+    if (!fs::is_directory(path, error)) {
+      addFile(path);
+      continue;
+    }
+    // A vdir (vdirsyncer's storage format): one card per *.vcf file of the folder.
+    std::vector<fs::path> files;
+    fs::directory_iterator entries(path, error);
+    for (; !error && entries != fs::directory_iterator(); entries.increment(error)) {
+      const fs::path& file = entries->path();
+      if (vcard::lowerAscii(file.extension().string()) == ".vcf" &&
+          entries->is_regular_file(error)) {
+        files.push_back(file);
+      }
+    }
+    if (error) throw VCardError(path.string(), std::nullopt, "cannot read: " + error.message());
+    std::sort(files.begin(), files.end());
+    for (const fs::path& file : files) addFile(file);
+  }
+}
+
+void VCardImport::addFile(const fs::path& file) {
+  addText(readFile(file), file.string());
+}
+
+void VCardImport::addText(std::string_view text, const std::string& source) {
+  // The whole file is converted before anything is kept, so a fault leaves no part of it.
+  std::vector<vcard::ConvertedCard> converted;
+  for (const vcard::Card& card : vcard::readCards(text, source)) {
+    converted.push_back(vcard::convertCard(card, source));
+  }
+  for (vcard::ConvertedCard& card : converted) {
+    if (card.kind == vcard::CardKind::Group) {
+      if (!card.groupNames.empty()) groupCards_.push_back(std::move(card));
+      continue;
+    }
+    if (auto known = contactIndex_.find(card.identifier); known != contactIndex_.end()) {
+      contacts_[known->second] = std::move(card);
+    } else {
+      contactIndex_.emplace(card.identifier, contacts_.size());
+      contacts_.push_back(std::move(card));
+    }
+  }
+  ++files_;
+}
+
+VCardImport::Groups VCardImport::groups() const {
+  Groups groups;
+  auto addMember = [&](const std::string& name, const std::string& contact) {
+    auto& [groupName, members] = groups.byIdentifier[vcard::groupIdentifier(name)];
+    groupName = name;
+    if (!contact.empty() && std::find(members.begin(), members.end(), contact) == members.end()) {
+      members.push_back(contact);
+    }
+  };
+  std::map<std::string, std::string, std::less<>> contactOfUid;
+  for (const vcard::ConvertedCard& contact : contacts_) {
+    for (const std::string& name : contact.groupNames) addMember(name, contact.identifier);
+    if (!contact.uid.empty()) {
+      std::string uid = contact.uid;
+      if (vcard::lowerAscii(uid).starts_with("urn:uuid:")) uid.erase(0, 9);
+      contactOfUid.emplace(uid, contact.identifier);
+    }
+  }
+  for (const vcard::ConvertedCard& group : groupCards_) {
+    addMember(group.groupNames.front(), "");
+    for (const std::string& uid : group.memberUids) {
+      if (auto contact = contactOfUid.find(uid); contact != contactOfUid.end()) {
+        addMember(group.groupNames.front(), contact->second);
+      }
+    }
+  }
+  for (auto& [identifier, group] : groups.byIdentifier) {
+    std::sort(group.second.begin(), group.second.end());
+  }
+  return groups;
+}
+
+std::size_t VCardImport::groupCount() const {
+  return groups().byIdentifier.size();
+}
+
+std::vector<Record> VCardImport::records() const {
+  const Groups allGroups = groups();
+  std::map<std::string, std::vector<std::string>, std::less<>> parents;
+  for (const auto& [identifier, group] : allGroups.byIdentifier) {
+    for (const std::string& member : group.second) parents[member].push_back(identifier);
+  }
+
+  std::vector<Record> records;
+  for (const vcard::ConvertedCard& contact : contacts_) {
+    Dictionary record = contact.attributes;
+    if (auto groupsOfContact = parents.find(contact.identifier); groupsOfContact != parents.end()) {
+      record.set(TesselRelationship_Contacts_Contact_ParentGroups,
+                 identifierArray(groupsOfContact->second));
+    }
+    static constexpr std::string_view kRelationships[] = {
+        TesselRelationship_Contacts_Contact_PhoneNumbers,
+        TesselRelationship_Contacts_Contact_EmailAddresses,
+        TesselRelationship_Contacts_Contact_StreetAddresses,
+        TesselRelationship_Contacts_Contact_URLs,
+        TesselRelationship_Contacts_Contact_IMs,
+    };
+    for (std::string_view relationship : kRelationships) {
+      std::vector<std::string> identifiers;
+      for (const vcard::RelatedRecord& related : contact.related) {
+        if (related.relationship == relationship) identifiers.push_back(related.record.id);
+      }
+      if (!identifiers.empty()) record.set(relationship, identifierArray(identifiers));
+    }
+    records.push_back(Record{contact.identifier, std::move(record)});
+    for (const vcard::RelatedRecord& related : contact.related) records.push_back(related.record);
+  }
+  for (const auto& [identifier, group] : allGroups.byIdentifier) {
+    records.push_back(Record{
+        identifier,
+        Dictionary{{TesselRecordEntityNameKey, TesselEntity_Contacts_Group},
+                   {TesselAttribute_Contacts_Group_Name, group.first},
+                   {TesselRelationship_Contacts_Group_Members, identifierArray(group.second)}}});
+  }
+  return records;
+}
+
+VCardImportSummary VCardImport::writeTo(Store& store, SyncDeletes syncDeletes) const {
+  std::vector<Record> records = this->records();
+  std::unordered_set<std::string> produced;
+  for (const Record& record : records) produced.insert(record.id);
+  std::set<std::string, std::less<>> importedContacts;
+  for (const vcard::ConvertedCard& contact : contacts_) importedContacts.insert(contact.identifier);
+
+  // What earlier imports left: their identifiers, and their groups' members.
+  std::vector<std::string> deletions;
+  std::map<std::string, std::vector<std::string>> earlierMembers;
+  store.forEachRecord([&](const Record& record) {
+    if (!vcard::isImportedIdentifier(record.id) || produced.contains(record.id)) {
+      if (record.id.starts_with(vcard::kGroupPrefix)) {
+        earlierMembers[record.id] =
+            stringsOf(record.record.find(TesselRelationship_Contacts_Group_Members));
+      }
+      return;
+    }
+    const std::string_view owner = vcard::owningContactIdentifier(record.id);
+    // The related records a re-imported contact no longer has are its own garbage.
+    if (syncDeletes == SyncDeletes::On || (!owner.empty() && importedContacts.contains(owner))) {
+      deletions.push_back(record.id);
+    } else if (record.id.starts_with(vcard::kGroupPrefix)) {
+      earlierMembers[record.id] =
+          stringsOf(record.record.find(TesselRelationship_Contacts_Group_Members));
+    }
+  });
+
+  if (syncDeletes == SyncDeletes::Off) {
+    // A group keeps the contacts of earlier imports that this one did not read again.
+    std::map<std::string, std::size_t> groupRecords;
+    for (std::size_t i = 0; i < records.size(); ++i) {
+      if (records[i].id.starts_with(vcard::kGroupPrefix)) groupRecords[records[i].id] = i;
+    }
+    for (const auto& [identifier, members] : earlierMembers) {
+      std::vector<std::string> kept;
+      for (const std::string& member : members) {
+        if (!importedContacts.contains(member)) kept.push_back(member);
+      }
+      auto producedGroup = groupRecords.find(identifier);
+      if (producedGroup == groupRecords.end()) {
+        if (kept == members) continue;
+        std::optional<Dictionary> earlier = store.record(identifier);
+        if (!earlier) continue;
+        earlier->set(TesselRelationship_Contacts_Group_Members, identifierArray(kept));
+        records.push_back(Record{identifier, std::move(*earlier)});
+        continue;
+      }
+      Dictionary& group = records[producedGroup->second].record;
+      std::vector<std::string> now =
+          stringsOf(group.find(TesselRelationship_Contacts_Group_Members));
+      for (std::string& member : now) {
+        if (std::find(kept.begin(), kept.end(), member) == kept.end()) kept.push_back(member);
+      }
+      std::sort(kept.begin(), kept.end());
+      group.set(TesselRelationship_Contacts_Group_Members, identifierArray(kept));
+    }
+  }
+
+  VCardImportSummary summary;
+  summary.contacts = contactCount();
+  summary.groups = groupCount();
+  summary.files = files_;
+  // The store writes and deletes in separate transactions; everything that can fail (the
+  // inputs) was checked before the first of them.
+  AppliedChanges applied = store.applyChanges(StoreChanges{records, deletions, std::nullopt});
+  summary.written = applied.written;
+  summary.deleted = applied.deleted;
+  return summary;
+}
+
+}  // namespace tessel

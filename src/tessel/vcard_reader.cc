@@ -1,0 +1,241 @@
+#include "tessel/vcard_reader.h"
+
+#include <algorithm>
+#include <optional>
+#include <stdexcept>
+
+#include "tessel/vcard_decoding.h"
+#include "tessel/vcard_error.h"
+
+namespace tessel::vcard {
+
+namespace {
+
+struct PhysicalLine {
+  std::size_t number;
+  std::string_view text;
+};
+
+std::vector<PhysicalLine> physicalLines(std::string_view text) {
+  // CRLF is the line end of every version; files saved by Unix tools end lines with LF
+  // alone, and old Mac ones with CR alone.
+  std::vector<PhysicalLine> lines;
+  std::size_t number = 1;
+  std::size_t start = 0;
+  for (std::size_t i = 0; i < text.size(); ++i) {
+    if (text[i] != '\r' && text[i] != '\n') continue;
+    lines.push_back({number++, text.substr(start, i - start)});
+    if (text[i] == '\r' && i + 1 < text.size() && text[i + 1] == '\n') ++i;
+    start = i + 1;
+  }
+  if (start < text.size()) lines.push_back({number, text.substr(start)});
+  return lines;
+}
+
+bool startsWithBlank(std::string_view text) {
+  return !text.empty() && (text.front() == ' ' || text.front() == '\t');
+}
+
+std::string upperAscii(std::string_view text) {
+  std::string out(text);
+  for (char& c : out) {
+    if (c >= 'a' && c <= 'z') c = static_cast<char>(c - 'a' + 'A');
+  }
+  return out;
+}
+
+// vCard 2.1 section 2.1.2 allows parameters without a name ("TEL;HOME;VOICE"); their name
+// follows from the value.
+std::string nameOfBareParameter(std::string_view value) {
+  const std::string upper = upperAscii(value);
+  if (upper == "QUOTED-PRINTABLE" || upper == "BASE64" || upper == "8BIT" || upper == "7BIT" ||
+      upper == "B") {
+    return "ENCODING";
+  }
+  return "TYPE";
+}
+
+class LineParser {
+ public:
+  LineParser(std::string_view text, std::size_t line, const std::string& source)
+      : text_(text), line_(line), source_(source) {}
+
+  ContentLine parse() {
+    ContentLine content;
+    content.line = line_;
+    const std::size_t nameEnd = text_.find_first_of(";:");
+    if (nameEnd == std::string_view::npos) fail("line has no colon");
+    std::string_view name = text_.substr(0, nameEnd);
+    if (const std::size_t dot = name.rfind('.'); dot != std::string_view::npos) {
+      content.group = std::string(name.substr(0, dot));
+      name.remove_prefix(dot + 1);
+    }
+    content.name = upperAscii(trimBlanks(name));
+    if (content.name.empty()) fail("property without a name");
+    pos_ = nameEnd;
+    while (text_[pos_] == ';') {
+      ++pos_;
+      content.parameters.push_back(parameter());
+      if (pos_ >= text_.size()) fail("line has no colon");
+    }
+    content.value = std::string(text_.substr(pos_ + 1));
+    return content;
+  }
+
+ private:
+  [[noreturn]] void fail(const std::string& reason) const {
+    throw VCardError(source_, line_, reason);
+  }
+
+  Parameter parameter() {
+    const std::size_t end = text_.find_first_of("=;:", pos_);
+    if (end == std::string_view::npos) fail("line has no colon");
+    Parameter parameter;
+    const std::string_view name = trimBlanks(text_.substr(pos_, end - pos_));
+    pos_ = end;
+    if (text_[end] != '=') {
+      if (!name.empty()) parameter = {nameOfBareParameter(name), {std::string(name)}};
+      return parameter;
+    }
+    parameter.name = upperAscii(name);
+    ++pos_;
+    while (true) {
+      parameter.values.push_back(parameterValue());
+      if (pos_ >= text_.size()) fail("line has no colon");
+      if (text_[pos_] != ',') break;
+      ++pos_;
+    }
+    return parameter;
+  }
+
+  std::string parameterValue() {
+    if (pos_ < text_.size() && text_[pos_] == '"') {
+      const std::size_t close = text_.find('"', pos_ + 1);
+      if (close == std::string_view::npos) fail("parameter value without its closing quote");
+      std::string value(text_.substr(pos_ + 1, close - pos_ - 1));
+      pos_ = close + 1;
+      return value;
+    }
+    const std::size_t end = std::min(text_.find_first_of(",;:", pos_), text_.size());
+    std::string value(trimBlanks(text_.substr(pos_, end - pos_)));
+    pos_ = end;
+    return value;
+  }
+
+  std::string_view text_;
+  std::size_t line_;
+  const std::string& source_;
+  std::size_t pos_ = 0;
+};
+
+bool isEncoding(const ContentLine& line, std::string_view lowerCaseEncoding) {
+  return lowerAscii(line.parameter("ENCODING")) == lowerCaseEncoding;
+}
+
+std::string decodeWholeText(std::string_view text, const std::string& source) {
+  // A byte-order mark names the encoding of the whole file.
+  if (text.starts_with("\xEF\xBB\xBF")) return std::string(text.substr(3));
+  if (text.starts_with("\xFE\xFF") || text.starts_with("\xFF\xFE")) {
+    try {
+      std::string utf8 = toUtf8(text, "UTF-16");
+      if (utf8.starts_with("\xEF\xBB\xBF")) utf8.erase(0, 3);
+      return utf8;
+    } catch (const std::invalid_argument&) {
+      throw VCardError(source, std::nullopt, "not valid UTF-16 text");
+    }
+  }
+  return std::string(text);
+}
+
+}  // namespace
+
+std::string_view ContentLine::parameter(std::string_view name) const {
+  for (const Parameter& p : parameters) {
+    if (p.name == name && !p.values.empty()) return p.values.front();
+  }
+  return {};
+}
+
+std::vector<std::string> ContentLine::types() const {
+  std::vector<std::string> types;
+  for (const Parameter& p : parameters) {
+    if (p.name != "TYPE") continue;
+    for (const std::string& value : p.values) {
+      // Some writers quote a whole list: TYPE="home,voice".
+      for (const std::string& part : splitUnescaped(value, ',')) {
+        types.push_back(lowerAscii(trimBlanks(part)));
+      }
+    }
+  }
+  return types;
+}
+
+bool ContentLine::hasType(std::string_view lowerCaseType) const {
+  const std::vector<std::string> all = types();
+  return std::find(all.begin(), all.end(), lowerCaseType) != all.end();
+}
+
+std::vector<Card> readCards(std::string_view input, const std::string& source) {
+  const std::string text = decodeWholeText(input, source);
+  const std::vector<PhysicalLine> lines = physicalLines(text);
+  std::vector<Card> cards;
+  Card card;
+  // Depth of BEGIN:VCARD; cards nested in a vCard 2.1 AGENT property are skipped.
+  int depth = 0;
+  std::size_t i = 0;
+  while (i < lines.size()) {
+    const PhysicalLine& first = lines[i++];
+    if (trimBlanks(first.text).empty()) continue;
+    // RFC 2425 section 5.8.1: a line end followed by one blank is removed with the blank.
+    std::string logical(first.text);
+    while (i < lines.size() && startsWithBlank(lines[i].text)) {
+      logical.append(lines[i++].text.substr(1));
+    }
+    ContentLine content = LineParser(logical, first.number, source).parse();
+    if (isEncoding(content, "quoted-printable")) {
+      // RFC 2045 section 6.7: a "=" at the end of a line is a soft break; the value goes on
+      // on the next line as it is, not folded.
+      while (content.value.ends_with('=') && i < lines.size()) {
+        content.value.pop_back();
+        content.value.append(lines[i++].text);
+        while (i < lines.size() && startsWithBlank(lines[i].text)) {
+          content.value.append(lines[i++].text.substr(1));
+        }
+      }
+    } else if (isEncoding(content, "base64") || isEncoding(content, "b")) {
+      // Some vCard 2.1 writers break base64 into lines that are not indented; base64 has no
+      // colon, so such a line cannot be a property.
+      while (i < lines.size() && !trimBlanks(lines[i].text).empty() &&
+             lines[i].text.find(':') == std::string_view::npos) {
+        content.value.append(lines[i++].text);
+      }
+    }
+
+    const bool isVCardMarker = lowerAscii(trimBlanks(content.value)) == "vcard";
+    if (content.name == "BEGIN" && isVCardMarker) {
+      if (depth++ == 0) card = Card{first.number, {}, {}};
+      continue;
+    }
+    if (content.name == "END" && isVCardMarker) {
+      if (depth == 0) throw VCardError(source, first.number, "END:VCARD without BEGIN:VCARD");
+      if (--depth == 0) cards.push_back(std::move(card));
+      continue;
+    }
+    if (depth == 0) {
+      throw VCardError(source, first.number,
+                       content.name + " outside of a card (BEGIN:VCARD ... END:VCARD)");
+    }
+    if (depth > 1) continue;
+    if (content.name == "VERSION") {
+      card.version = std::string(trimBlanks(content.value));
+      continue;
+    }
+    card.properties.push_back(std::move(content));
+  }
+  if (depth > 0) {
+    throw VCardError(source, card.line, "card has no END:VCARD");
+  }
+  return cards;
+}
+
+}  // namespace tessel::vcard

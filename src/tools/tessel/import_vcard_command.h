@@ -1,0 +1,17 @@
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "tessel/vcard_import.h"
+#include "tools/tessel/command_context.h"
+
+namespace tessel::cli {
+
+// `import vcard PATH... [--sync-deletes]`: reads every file and folder (every *.vcf in it)
+// before the store is opened, so that a malformed card anywhere (reported with its file and
+// line) imports nothing. Prints "N contacts, M groups from K files; X written, Y deleted".
+void importVCards(CommandContext& context, const std::vector<std::string>& paths,
+                  SyncDeletes syncDeletes);
+
+}  // namespace tessel::cli
