@@ -40,15 +40,16 @@ void setClientFilter(CommandContext& context, const std::string& identifier,
   Store& store = context.store();
   std::unique_ptr<Client> client = store.clientWithIdentifier(identifier);
   if (!client) {
-    throw Exception(TesselUnknownClientException,
-                    "no client \"" + identifier + "\" is registered in " +
-                        context.storePath().string());
+    throw Exception(
+        TesselUnknownClientException,
+        "no client \"" + identifier + "\" is registered in " + context.storePath().string());
   }
 
   const bool contacts = dataClass == FilterDataClass::Contacts;
   std::string_view entity =
       contacts ? TesselEntity_Contacts_Group : TesselEntity_Calendars_Calendar;
-  std::shared_ptr<Snapshot> snapshot = store.snapshotOfRecordsInTruth({std::string(entity)}, *client);
+  std::shared_ptr<Snapshot> snapshot =
+      store.snapshotOfRecordsInTruth({std::string(entity)}, *client);
 
   std::shared_ptr<Filtering> filter;
   if (contacts) {

@@ -14,7 +14,10 @@
 #include "tessel/exception.h"
 #include "tools/tessel/client_commands.h"
 #include "tools/tessel/command_context.h"
+#include "tools/tessel/device_commands.h"
 #include "tools/tessel/filter_commands.h"
+#include "tools/tessel/import_ical_command.h"
+#include "tools/tessel/import_vcard_command.h"
 #include "tools/tessel/record_commands.h"
 #include "tools/tessel/usage_error.h"
 
@@ -79,6 +82,45 @@ int main(int argc, char** argv) {
   list->callback([&] {
     command = [&](CommandContext& context) {
       listRecords(context, listEntity, listJson ? ListFormat::TypedJson : ListFormat::Readable);
+    };
+  });
+
+  auto* import = app.add_subcommand("import", "Read address books and calendars into truth");
+  import->require_subcommand(1);
+
+  std::vector<std::string> vcardPaths;
+  bool vcardSyncDeletes = false;
+  auto* vcard = import->add_subcommand(
+      "vcard",
+      "vCard 2.1, 3.0 and 4.0 files, and folders of .vcf files (vdir); CATEGORIES become "
+      "groups. Nothing is imported unless every file is valid");
+  vcard->add_option("PATH", vcardPaths, ".vcf files or folders")->required();
+  vcard->add_flag("--sync-deletes", vcardSyncDeletes,
+                  "Also delete the records of earlier vCard imports that this one does not "
+                  "produce");
+  vcard->callback([&] {
+    command = [&](CommandContext& context) {
+      importVCards(context, vcardPaths,
+                   vcardSyncDeletes ? tessel::SyncDeletes::On : tessel::SyncDeletes::Off);
+    };
+  });
+
+  std::vector<std::string> icalPaths;
+  std::optional<std::string> icalTitle;
+  bool icalSyncDeletes = false;
+  auto* ical = import->add_subcommand(
+      "ical",
+      "iCalendar files and folders of .ics files (vdir), one calendar per file or folder. "
+      "Nothing is imported unless every file is valid");
+  ical->add_option("PATH", icalPaths, ".ics files or folders")->required();
+  ical->add_option("--title", icalTitle,
+                   "Title of calendars whose source names none (default: the file name)");
+  ical->add_flag("--sync-deletes", icalSyncDeletes,
+                 "Also delete the records of these calendars that this import does not produce");
+  ical->callback([&] {
+    command = [&](CommandContext& context) {
+      importICalendars(context, icalPaths, icalTitle,
+                       icalSyncDeletes ? tessel::SyncDeletes::On : tessel::SyncDeletes::Off);
     };
   });
 
@@ -152,9 +194,9 @@ int main(int argc, char** argv) {
         if (!filterAll && filterIds.empty()) {
           throw UsageError(std::string("say --all or ") + idsOption);
         }
-        setClientFilter(context, clientId, dataClass,
-                        filterAll ? std::nullopt
-                                  : std::optional<std::vector<std::string>>(filterIds));
+        setClientFilter(
+            context, clientId, dataClass,
+            filterAll ? std::nullopt : std::optional<std::vector<std::string>>(filterIds));
       };
     });
   };
@@ -169,6 +211,20 @@ int main(int argc, char** argv) {
   cancel->add_option("ID", clientId, "Client identifier")->required();
   cancel->callback(
       [&] { command = [&](CommandContext& context) { cancelSession(context, clientId); }; });
+
+  auto* devices = app.add_subcommand("devices", "The connected Zeto players and their identifiers");
+  devices->callback([&] { command = [](CommandContext& context) { listDevices(context); }; });
+
+  std::optional<std::string> watchedClient;
+  int commandStatus = 0;
+  auto* watch = app.add_subcommand(
+      "watch",
+      "Show the progress of running syncs; with a client, until its sync ends (exit status: "
+      "0 success, 1 cancelled, 2 error, 3 player unavailable)");
+  watch->add_option("ID", watchedClient, "Client identifier");
+  watch->callback([&] {
+    command = [&](CommandContext& context) { commandStatus = watchSyncs(context, watchedClient); };
+  });
 
   try {
     app.parse(argc, argv);
@@ -187,7 +243,7 @@ int main(int argc, char** argv) {
     if (command) command(context);
     std::cout.flush();
     if (!std::cout) return fail(kFailure, "cannot write to standard output");
-    return 0;
+    return commandStatus;
   } catch (const UsageError& e) {
     return fail(kUsage, e.what());
   } catch (const tessel::Exception& e) {

@@ -323,6 +323,28 @@ TEST_F(TesselCommand, ClientFiltersSelectExistingGroupsAndCalendarsOnly) {
   EXPECT_EQ(tessel({"client", "filter", "ghost", "contacts", "--all"}).status, 1);
 }
 
+TEST_F(TesselCommand, DevicesListsThePlayersWithTheirSuggestedClients) {
+  writeFile(dir_ / "players.json",
+            R"([{"id": "000A27001A2B3C4D", "volume": ")" + (dir_ / "vol").string() +
+                R"(", "mounted": true}, {"id": "1a2b", "volume": "/nowhere", "mounted": false}])");
+  setenv("ZETO_VIRTUAL_DEVICES", (dir_ / "players.json").c_str(), 1);
+  Outcome run = tessel({"devices"});
+  EXPECT_EQ(run.status, 0) << run.err;
+  EXPECT_EQ(run.out, "A27001A2B3C4D\t" + (dir_ / "vol").string() +
+                         "\tclient: zeto-A27001A2B3C4D\n"
+                         "1A2B\tnot mounted\tclient: zeto-1A2B\n");
+
+  writeFile(dir_ / "players.json", "[]");
+  run = tessel({"devices"});
+  EXPECT_EQ(run.out, "no Zeto player is connected\n");
+
+  writeFile(dir_ / "players.json", "{not json");
+  run = tessel({"devices"});
+  EXPECT_EQ(run.status, 1);
+  EXPECT_CONTAINS(run.err, "tessel: cannot list the connected players");
+  unsetenv("ZETO_VIRTUAL_DEVICES");
+}
+
 TEST_F(TesselCommand, SessionCancelWithNothingRunningSaysSo) {
   ASSERT_EQ(tessel({"init"}).status, 0);
   ASSERT_EQ(tessel({"client", "register", "c", "--calendars"}).status, 0);
