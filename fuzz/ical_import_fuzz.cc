@@ -1,5 +1,5 @@
 // Fuzzes the iCalendar import over arbitrary bytes: the line checks, libical's parse, the
-// time zones and every value read into records. A malformed input must end in ICalError,
+// time zones and every value read into records. A malformed input must end in ImportError,
 // never in a crash, a leak or another exception.
 #include <cstddef>
 #include <cstdint>
@@ -7,7 +7,7 @@
 #include <string>
 
 #include "tessel/ical_calendar_reader.h"
-#include "tessel/ical_error.h"
+#include "tessel/import_error.h"
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   tessel::ICalCalendarSource source;
@@ -17,7 +17,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   tessel::ICalCalendar calendar;
   try {
     calendar = tessel::readICalCalendar(source);
-  } catch (const tessel::ICalError& e) {
+  } catch (const tessel::ImportError& e) {
     // Every fault inside a file names its line.
     if (!e.line()) __builtin_trap();
     return 0;

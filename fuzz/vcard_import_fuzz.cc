@@ -1,11 +1,11 @@
 // Fuzzes the vCard import over arbitrary bytes: reading the cards, decoding every value
 // (encodings, charsets, escapes) and building the records. A malformed input must end in
-// VCardError, never in a crash, a leak or another exception.
+// ImportError, never in a crash, a leak or another exception.
 #include <cstddef>
 #include <cstdint>
 #include <string_view>
 
-#include "tessel/vcard_error.h"
+#include "tessel/import_error.h"
 #include "tessel/vcard_import.h"
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
@@ -13,7 +13,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   tessel::VCardImport import;
   try {
     import.addText(text, "fuzz.vcf");
-  } catch (const tessel::VCardError&) {
+  } catch (const tessel::ImportError&) {
     return 0;
   }
   // Converted cards always make records that name their entity, with unique identifiers.

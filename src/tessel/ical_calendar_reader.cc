@@ -12,7 +12,7 @@
 #include "platform/calendar_date.h"
 #include "platform/value.h"
 #include "tessel/ical_document.h"
-#include "tessel/ical_error.h"
+#include "tessel/import_error.h"
 #include "tessel/ical_time_zones.h"
 #include "tessel/schema.h"
 
@@ -167,13 +167,13 @@ struct Item {
   std::vector<std::string> detached;
 };
 
-// Reads the values of one component, raising ICalError at the line of a faulty one.
+// Reads the values of one component, raising ImportError at the line of a faulty one.
 class ComponentReader {
  public:
   ComponentReader(const ICalDocument& document, ICalTimeZones& zones, icalcomponent* component)
       : document_(document), zones_(zones), component_(component) {}
 
-  ICalError error(icalproperty* property, std::string reason) const {
+  ImportError error(icalproperty* property, std::string reason) const {
     return document_.errorAt(property, component_, std::move(reason));
   }
 

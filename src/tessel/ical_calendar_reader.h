@@ -41,7 +41,7 @@ struct ICalCalendar {
 // Reads the VEVENT and VTODO components of the source's files into records of the calendars
 // schema. Identifiers come from the calendar's identifier and each component's UID (and
 // RECURRENCE-ID), so that reading the same source again gives the same identifiers. Raises
-// ICalError naming the file and line of the first fault: text libical refuses, a date that
+// ImportError naming the file and line of the first fault: text libical refuses, a date that
 // does not exist, a TZID that nothing defines.
 ICalCalendar readICalCalendar(const ICalCalendarSource& source);
 

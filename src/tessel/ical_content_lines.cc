@@ -3,7 +3,7 @@
 #include <optional>
 #include <utility>
 
-#include "tessel/ical_error.h"
+#include "tessel/import_error.h"
 
 namespace tessel {
 
@@ -100,8 +100,8 @@ std::optional<std::size_t> valueStart(std::string_view line, std::size_t nameEnd
 
 std::vector<ICalContentLine> readICalContentLines(std::string_view text,
                                                   const std::string& source) {
-  const auto fail = [&](std::size_t line, std::string reason) -> ICalError {
-    return ICalError(source, line, std::move(reason));
+  const auto fail = [&](std::size_t line, std::string reason) -> ImportError {
+    return ImportError(source, line, std::move(reason));
   };
 
   // A byte order mark is not part of the text (some Windows programs write one).

@@ -24,7 +24,7 @@ struct ICalContentLine {
 // Reads the text of one iCalendar file into its content lines: checks that it is UTF-8,
 // unfolds it (RFC 5545 section 3.1), and checks that its components nest as BEGIN and END
 // say, inside VCALENDAR objects. Lines that hold nothing (blank lines, properties with an
-// empty value, libical's own X-LIC-ERROR remarks) are left out. Raises ICalError naming
+// empty value, libical's own X-LIC-ERROR remarks) are left out. Raises ImportError naming
 // `source` and the line of the first fault.
 std::vector<ICalContentLine> readICalContentLines(std::string_view text, const std::string& source);
 

@@ -117,7 +117,7 @@ ICalDocument ICalDocument::parse(std::string_view text, std::string source) {
       case ICalContentLine::Kind::Property:
         if (isLineTag(line.name)) break;
         if (std::optional<std::string> complaint = complaintAbout(line.text)) {
-          throw ICalError(source, line.line, line.name + ": " + *complaint);
+          throw ImportError(source, line.line, line.name + ": " + *complaint);
         }
         tagged += taggedLine(line) + "\r\n";
         break;
@@ -125,16 +125,16 @@ ICalDocument ICalDocument::parse(std::string_view text, std::string source) {
   }
 
   OwnedComponent root(icalparser_parse_string(tagged.c_str()));
-  if (!root) throw ICalError(source, 1, "libical cannot read this file");
+  if (!root) throw ImportError(source, 1, "libical cannot read this file");
   // Every line passed on its own; whatever libical still finds wrong is reported at the
   // component it concerns.
   icalcomponent* where = nullptr;
   if (icalproperty* error = firstError(root.get(), &where)) {
-    throw ICalError(source, lineOf(where), errorText(error));
+    throw ImportError(source, lineOf(where), errorText(error));
   }
   const icalcomponent_kind kind = icalcomponent_isa(root.get());
   if (kind != ICAL_VCALENDAR_COMPONENT && kind != ICAL_XROOT_COMPONENT) {
-    throw ICalError(source, lineOf(root.get()), "no VCALENDAR in this file");
+    throw ImportError(source, lineOf(root.get()), "no VCALENDAR in this file");
   }
   return ICalDocument(root.release(), std::move(source));
 }
@@ -194,11 +194,11 @@ std::optional<std::size_t> ICalDocument::lineOf(icalcomponent* component) {
   return std::nullopt;
 }
 
-ICalError ICalDocument::errorAt(icalproperty* property, icalcomponent* component,
+ImportError ICalDocument::errorAt(icalproperty* property, icalcomponent* component,
                                 std::string reason) const {
   std::optional<std::size_t> line = lineOf(property);
   if (!line) line = lineOf(component);
-  return ICalError(source_, line, std::move(reason));
+  return ImportError(source_, line, std::move(reason));
 }
 
 }  // namespace tessel

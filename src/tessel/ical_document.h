@@ -7,7 +7,7 @@
 #include <utility>
 #include <vector>
 
-#include "tessel/ical_error.h"
+#include "tessel/import_error.h"
 
 // libical's types, declared here so that only the importer's sources include libical.
 struct icalcomponent_impl;
@@ -20,7 +20,7 @@ namespace tessel {
 // came from (lineOf), for the messages of later checks.
 class ICalDocument {
  public:
-  // Raises ICalError naming `source` and the line of the first fault.
+  // Raises ImportError naming `source` and the line of the first fault.
   static ICalDocument parse(std::string_view text, std::string source);
 
   ICalDocument(ICalDocument&& other) noexcept;
@@ -37,9 +37,9 @@ class ICalDocument {
   static std::optional<std::size_t> lineOf(icalproperty_impl* property);
   static std::optional<std::size_t> lineOf(icalcomponent_impl* component);
 
-  // An ICalError about this file at the line of `property` (or of `component` when the
+  // An ImportError about this file at the line of `property` (or of `component` when the
   // property is null).
-  ICalError errorAt(icalproperty_impl* property, icalcomponent_impl* component,
+  ImportError errorAt(icalproperty_impl* property, icalcomponent_impl* component,
                     std::string reason) const;
 
  private:

@@ -32,10 +32,10 @@ std::string lowerCased(std::string text) {
 
 std::string readText(const fs::path& path, const std::string& name) {
   std::ifstream in(path, std::ios::binary);
-  if (!in) throw ICalError(name, std::nullopt, std::string("cannot read: ") + std::strerror(errno));
+  if (!in) throw ImportError(name, std::nullopt, std::string("cannot read: ") + std::strerror(errno));
   std::ostringstream text;
   text << in.rdbuf();
-  if (in.bad()) throw ICalError(name, std::nullopt, "cannot read");
+  if (in.bad()) throw ImportError(name, std::nullopt, "cannot read");
   return std::move(text).str();
 }
 
@@ -62,7 +62,7 @@ ICalCalendarSource folderSource(const fs::path& folder, const std::string& name,
     if (!it->is_regular_file(error)) continue;
     if (lowerCased(it->path().extension().string()) == ".ics") files.push_back(it->path());
   }
-  if (error) throw ICalError(name, std::nullopt, "cannot list the folder: " + error.message());
+  if (error) throw ImportError(name, std::nullopt, "cannot list the folder: " + error.message());
   // Folder order is the file system's; file names give a stable one.
   std::sort(files.begin(), files.end());
   for (const fs::path& file : files) {
@@ -143,7 +143,7 @@ std::vector<ICalCalendar> readICalendarPaths(const std::vector<fs::path>& paths,
     } else if (fs::is_regular_file(status)) {
       source = fileSource(path, name, title);
     } else {
-      throw ICalError(name, std::nullopt, "no such file or folder");
+      throw ImportError(name, std::nullopt, "no such file or folder");
     }
     // The same calendar named twice is imported once.
     if (!seen.insert(source.identifier).second) continue;

@@ -7,7 +7,7 @@
 #include <vector>
 
 #include "tessel/ical_calendar_reader.h"
-#include "tessel/ical_error.h"
+#include "tessel/import_error.h"
 #include "tessel/store.h"
 // SyncDeletes, which both importers take, is declared with the vCard importer.
 #include "tessel/vcard_import.h"
@@ -20,7 +20,7 @@ namespace tessel {
 
 // Reads every path into its calendar. A file's calendar is named by its X-WR-CALNAME, else
 // `title`, else the file name without its extension; a folder's by its vdir "displayname"
-// file, else `title`, else the folder's name. Raises ICalError at the first fault of any
+// file, else `title`, else the folder's name. Raises ImportError at the first fault of any
 // file (a path that is neither a file nor a folder included).
 std::vector<ICalCalendar> readICalendarPaths(const std::vector<std::filesystem::path>& paths,
                                              const std::optional<std::string>& title);

@@ -7,7 +7,7 @@
 
 #include "tessel/schema.h"
 #include "tessel/vcard_decoding.h"
-#include "tessel/vcard_error.h"
+#include "tessel/import_error.h"
 #include "tessel/vcard_identifiers.h"
 
 namespace tessel::vcard {
@@ -135,7 +135,7 @@ class Converter {
       }
       return toUtf8(line.value, named);
     } catch (const std::invalid_argument& e) {
-      throw VCardError(source_, line.line, std::string(e.what()) + " in " + line.name);
+      throw ImportError(source_, line.line, std::string(e.what()) + " in " + line.name);
     }
   }
 
@@ -412,7 +412,7 @@ class Converter {
         return;
       }
     } catch (const std::invalid_argument& e) {
-      throw VCardError(source_, line.line, std::string(e.what()) + " in PHOTO");
+      throw ImportError(source_, line.line, std::string(e.what()) + " in PHOTO");
     }
     if (image_.empty()) image_ = std::move(bytes);
   }

@@ -38,7 +38,7 @@ struct ConvertedCard {
 };
 
 // Decodes every property (transfer encoding, charset, escapes) and maps what the contacts
-// schema holds. Raises VCardError naming `source` and the property's line for a value that
+// schema holds. Raises ImportError naming `source` and the property's line for a value that
 // cannot be decoded: bad base64 or quoted-printable, an unknown or mismatched charset.
 // A group card without a name converts to a group without names, which the import skips.
 ConvertedCard convertCard(const Card& card, const std::string& source);

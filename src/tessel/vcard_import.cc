@@ -12,7 +12,7 @@
 
 #include "tessel/schema.h"
 #include "tessel/vcard_decoding.h"
-#include "tessel/vcard_error.h"
+#include "tessel/import_error.h"
 #include "tessel/vcard_identifiers.h"
 #include "tessel/vcard_reader.h"
 
@@ -29,16 +29,16 @@ namespace fs = std::filesystem;
 std::string readFile(const fs::path& file) {
   std::error_code error;
   if (fs::is_directory(file, error)) {
-    throw VCardError(file.string(), std::nullopt, "cannot read: it is a folder");
+    throw ImportError(file.string(), std::nullopt, "cannot read: it is a folder");
   }
   std::ifstream in(file, std::ios::binary);
   if (!in) {
-    throw VCardError(file.string(), std::nullopt,
+    throw ImportError(file.string(), std::nullopt,
                      std::string("cannot read: ") + std::strerror(errno));
   }
   std::ostringstream text;
   text << in.rdbuf();
-  if (in.bad()) throw VCardError(file.string(), std::nullopt, "cannot read");
+  if (in.bad()) throw ImportError(file.string(), std::nullopt, "cannot read");
   return std::move(text).str();
 }
 
@@ -75,7 +75,7 @@ void VCardImport::addPaths(const std::vector<fs::path>& paths) {
         files.push_back(file);
       }
     }
-    if (error) throw VCardError(path.string(), std::nullopt, "cannot read: " + error.message());
+    if (error) throw ImportError(path.string(), std::nullopt, "cannot read: " + error.message());
     std::sort(files.begin(), files.end());
     for (const fs::path& file : files) addFile(file);
   }

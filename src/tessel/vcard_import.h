@@ -26,7 +26,7 @@ struct VCardImportSummary {
 };
 
 // An import of vCard 2.1, 3.0 and 4.0 address books into the contacts schema, in two
-// phases: every input is read and converted first (a fault raises VCardError naming the file
+// phases: every input is read and converted first (a fault raises ImportError naming the file
 // and line, and nothing has been written), then everything is written at once.
 //
 //   VCardImport import;

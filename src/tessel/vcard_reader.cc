@@ -5,7 +5,7 @@
 #include <stdexcept>
 
 #include "tessel/vcard_decoding.h"
-#include "tessel/vcard_error.h"
+#include "tessel/import_error.h"
 
 namespace tessel::vcard {
 
@@ -84,7 +84,7 @@ class LineParser {
 
  private:
   [[noreturn]] void fail(const std::string& reason) const {
-    throw VCardError(source_, line_, reason);
+    throw ImportError(source_, line_, reason);
   }
 
   Parameter parameter() {
@@ -141,7 +141,7 @@ std::string decodeWholeText(std::string_view text, const std::string& source) {
       if (utf8.starts_with("\xEF\xBB\xBF")) utf8.erase(0, 3);
       return utf8;
     } catch (const std::invalid_argument&) {
-      throw VCardError(source, std::nullopt, "not valid UTF-16 text");
+      throw ImportError(source, std::nullopt, "not valid UTF-16 text");
     }
   }
   return std::string(text);
@@ -217,12 +217,12 @@ std::vector<Card> readCards(std::string_view input, const std::string& source) {
       continue;
     }
     if (content.name == "END" && isVCardMarker) {
-      if (depth == 0) throw VCardError(source, first.number, "END:VCARD without BEGIN:VCARD");
+      if (depth == 0) throw ImportError(source, first.number, "END:VCARD without BEGIN:VCARD");
       if (--depth == 0) cards.push_back(std::move(card));
       continue;
     }
     if (depth == 0) {
-      throw VCardError(source, first.number,
+      throw ImportError(source, first.number,
                        content.name + " outside of a card (BEGIN:VCARD ... END:VCARD)");
     }
     if (depth > 1) continue;
@@ -233,7 +233,7 @@ std::vector<Card> readCards(std::string_view input, const std::string& source) {
     card.properties.push_back(std::move(content));
   }
   if (depth > 0) {
-    throw VCardError(source, card.line, "card has no END:VCARD");
+    throw ImportError(source, card.line, "card has no END:VCARD");
   }
   return cards;
 }

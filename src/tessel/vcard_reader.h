@@ -39,7 +39,7 @@ struct Card {
 };
 
 // Every card of a text, in order. A byte-order mark (UTF-8, or UTF-16 of either order)
-// opens the text or is absent. Faults raise VCardError naming `source` and the line: a line
+// opens the text or is absent. Faults raise ImportError naming `source` and the line: a line
 // without a colon, a property outside a card, a card without END:VCARD.
 std::vector<Card> readCards(std::string_view text, const std::string& source);
 

@@ -1,4 +1,4 @@
-#include "tessel/vcard_error.h"
+#include "tessel/import_error.h"
 
 #include <utility>
 
@@ -15,7 +15,7 @@ std::string describe(const std::string& source, std::optional<std::size_t> line,
 
 }  // namespace
 
-VCardError::VCardError(std::string source, std::optional<std::size_t> line, std::string reason)
+ImportError::ImportError(std::string source, std::optional<std::size_t> line, std::string reason)
     : std::runtime_error(describe(source, line, reason)),
       source_(std::move(source)),
       line_(line),

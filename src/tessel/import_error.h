@@ -7,12 +7,13 @@
 
 namespace tessel {
 
-// What is wrong with a vCard input, and where: the file (or the name the text was given)
-// and the 1-based line on which the faulty property or card starts. Its text reads
-// "contacts.vcf: line 12: bad base64 in PHOTO".
-class VCardError : public std::runtime_error {
+// What is wrong with an imported file, and where: the file (or the name the text was given)
+// and the 1-based line on which the faulty property, card or component starts. Its text reads
+// "contacts.vcf: line 12: bad base64 in PHOTO" or "work.ics: line 12: DTSTART: February has
+// no day 30".
+class ImportError : public std::runtime_error {
  public:
-  VCardError(std::string source, std::optional<std::size_t> line, std::string reason);
+  ImportError(std::string source, std::optional<std::size_t> line, std::string reason);
 
   const std::string& source() const { return source_; }
   // Absent when the fault is the file as a whole (it cannot be read).
