@@ -265,7 +265,7 @@ TEST(ICalImportReading, MalformedInputNamesFileAndLine) {
     try {
       readText(c.text);
       ADD_FAILURE() << "accepted";
-    } catch (const ICalError& e) {
+    } catch (const ImportError& e) {
       EXPECT_EQ(e.source(), "test.ics");
       EXPECT_EQ(e.line(), c.line) << e.what();
       EXPECT_CONTAINS(e.reason(), c.reason);
@@ -418,14 +418,14 @@ TEST_F(ICalImportStore, AFaultInAnyFileReadsNothing) {
   try {
     readICalendarPaths({good, bad}, std::nullopt);
     ADD_FAILURE() << "accepted";
-  } catch (const ICalError& e) {
+  } catch (const ImportError& e) {
     EXPECT_EQ(e.source(), bad.string());
     EXPECT_EQ(e.line(), 5u);
   }
   try {
     readICalendarPaths({good, folder_ / "missing"}, std::nullopt);
     ADD_FAILURE() << "accepted";
-  } catch (const ICalError& e) {
+  } catch (const ImportError& e) {
     EXPECT_EQ(e.what(), (folder_ / "missing").string() + ": no such file or folder");
   }
 }

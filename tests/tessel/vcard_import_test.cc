@@ -14,7 +14,7 @@
 #include "platform/base64.h"
 #include "tessel/schema.h"
 #include "tessel/test_store.h"
-#include "tessel/vcard_error.h"
+#include "tessel/import_error.h"
 
 namespace tessel {
 namespace {
@@ -345,7 +345,7 @@ TEST(VCardImportMalformed, EachFaultNamesFileAndLine) {
     try {
       import.addPaths({kData / "vdir", file});
       ADD_FAILURE() << c.file << " was accepted";
-    } catch (const VCardError& e) {
+    } catch (const ImportError& e) {
       EXPECT_EQ(e.source(), file.string());
       EXPECT_EQ(e.line(), c.line) << c.file;
       EXPECT_EQ(e.reason(), c.reason);
@@ -376,7 +376,7 @@ TEST(VCardImportMalformed, OtherFaults) {
     try {
       import.addText(c.text, "x.vcf");
       ADD_FAILURE() << c.text << " was accepted";
-    } catch (const VCardError& e) {
+    } catch (const ImportError& e) {
       EXPECT_EQ(e.reason(), c.reason) << c.text;
     }
   }
@@ -385,7 +385,7 @@ TEST(VCardImportMalformed, OtherFaults) {
   try {
     import.addPaths({kData / "no-such.vcf"});
     ADD_FAILURE();
-  } catch (const VCardError& e) {
+  } catch (const ImportError& e) {
     EXPECT_FALSE(e.line());
   }
 }
@@ -519,7 +519,7 @@ TEST_F(VCardImportStore, AMalformedFileStopsTheImportBeforeAnyWrite) {
   const auto before = all();
   write("b.vcf", card("b", "Roe;Rick", ""));
   write("c.vcf", "BEGIN:VCARD\r\nN:Broken;\r\n");
-  EXPECT_THROW(import(SyncDeletes::On), VCardError);
+  EXPECT_THROW(import(SyncDeletes::On), ImportError);
   EXPECT_EQ(all(), before);
 }
 
