@@ -4,6 +4,7 @@
 #include <utility>
 
 #include "tessel/import_error.h"
+#include "tessel/physical_lines.h"
 
 namespace tessel {
 
@@ -58,28 +59,6 @@ std::size_t utf8SequenceLength(std::string_view text, std::size_t i) {
     if (byte(i + k) < 0x80 || byte(i + k) > 0xBF) return 0;
   }
   return length;
-}
-
-struct PhysicalLine {
-  std::size_t number;
-  std::string_view text;
-};
-
-// RFC 5545 section 3.1 ends lines with CR LF; files that went through Unix tools end them
-// with LF, and old Mac programs with CR. All three end a line here, so that no CR is left
-// inside a line for libical to read as a line end of its own.
-std::vector<PhysicalLine> physicalLines(std::string_view text) {
-  std::vector<PhysicalLine> lines;
-  std::size_t number = 1;
-  std::size_t start = 0;
-  for (std::size_t i = 0; i < text.size(); ++i) {
-    if (text[i] != '\n' && text[i] != '\r') continue;
-    lines.push_back({number++, text.substr(start, i - start)});
-    if (text[i] == '\r' && i + 1 < text.size() && text[i + 1] == '\n') ++i;
-    start = i + 1;
-  }
-  if (start < text.size()) lines.push_back({number, text.substr(start)});
-  return lines;
 }
 
 // Where the value starts: after the first colon that is not inside a quoted parameter value

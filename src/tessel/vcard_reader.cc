@@ -4,33 +4,13 @@
 #include <optional>
 #include <stdexcept>
 
-#include "tessel/vcard_decoding.h"
 #include "tessel/import_error.h"
+#include "tessel/physical_lines.h"
+#include "tessel/vcard_decoding.h"
 
 namespace tessel::vcard {
 
 namespace {
-
-struct PhysicalLine {
-  std::size_t number;
-  std::string_view text;
-};
-
-std::vector<PhysicalLine> physicalLines(std::string_view text) {
-  // CRLF is the line end of every version; files saved by Unix tools end lines with LF
-  // alone, and old Mac ones with CR alone.
-  std::vector<PhysicalLine> lines;
-  std::size_t number = 1;
-  std::size_t start = 0;
-  for (std::size_t i = 0; i < text.size(); ++i) {
-    if (text[i] != '\r' && text[i] != '\n') continue;
-    lines.push_back({number++, text.substr(start, i - start)});
-    if (text[i] == '\r' && i + 1 < text.size() && text[i + 1] == '\n') ++i;
-    start = i + 1;
-  }
-  if (start < text.size()) lines.push_back({number, text.substr(start)});
-  return lines;
-}
 
 bool startsWithBlank(std::string_view text) {
   return !text.empty() && (text.front() == ' ' || text.front() == '\t');
@@ -223,7 +203,7 @@ std::vector<Card> readCards(std::string_view input, const std::string& source) {
     }
     if (depth == 0) {
       throw ImportError(source, first.number,
-                       content.name + " outside of a card (BEGIN:VCARD ... END:VCARD)");
+                        content.name + " outside of a card (BEGIN:VCARD ... END:VCARD)");
     }
     if (depth > 1) continue;
     if (content.name == "VERSION") {
