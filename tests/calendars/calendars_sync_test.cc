@@ -57,25 +57,9 @@ class CalendarsSync : public SynctoolTest {
 
   // Runs `tessel --store <the test's store> args...`; the test fails when it fails.
   void tessel(const std::vector<std::string>& args) {
-    std::vector<std::string> all = {TESSEL_BINARY, "--store", (folder() / "truth.db").string()};
-    all.insert(all.end(), args.begin(), args.end());
-    std::vector<char*> argv;
-    for (std::string& arg : all) argv.push_back(arg.data());
-    argv.push_back(nullptr);
-    const std::string output = (folder() / "tessel.out").string();
-    posix_spawn_file_actions_t actions;
-    posix_spawn_file_actions_init(&actions);
-    posix_spawn_file_actions_addopen(&actions, 1, output.c_str(), O_WRONLY | O_CREAT | O_TRUNC,
-                                     0644);
-    posix_spawn_file_actions_adddup2(&actions, 1, 2);
-    pid_t pid = 0;
-    int status = -1;
-    if (posix_spawn(&pid, argv[0], &actions, nullptr, argv.data(), environ) == 0) {
-      waitpid(pid, &status, 0);
-    }
-    posix_spawn_file_actions_destroy(&actions);
-    ASSERT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0)
-        << "tessel " << ::testing::PrintToString(args) << ": " << readFile(output);
+    const TesselRun run = runTessel(args);
+    ASSERT_EQ(run.exitStatus, 0) << "tessel " << ::testing::PrintToString(args) << ": "
+                                 << run.output;
   }
 
   void put(std::initializer_list<Json> records) {

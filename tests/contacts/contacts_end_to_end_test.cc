@@ -19,25 +19,7 @@ namespace fs = std::filesystem;
 
 class ContactsEndToEnd : public sync::test_support::SynctoolTest {
  protected:
-  // `tessel --store <the test's store> arguments...`; answers its exit status.
-  int tessel(const std::vector<std::string>& arguments) {
-    std::vector<std::string> words = {TESSEL_BINARY, "--store", (folder() / "truth.db").string()};
-    words.insert(words.end(), arguments.begin(), arguments.end());
-    std::vector<char*> argv;
-    for (std::string& word : words) argv.push_back(word.data());
-    argv.push_back(nullptr);
-    posix_spawn_file_actions_t actions;
-    posix_spawn_file_actions_init(&actions);
-    posix_spawn_file_actions_addopen(&actions, 1, "/dev/null", O_WRONLY, 0);
-    pid_t pid = 0;
-    int status = -1;
-    char* noEnvironment[] = {nullptr};
-    if (posix_spawn(&pid, argv[0], &actions, nullptr, argv.data(), noEnvironment) == 0) {
-      waitpid(pid, &status, 0);
-    }
-    posix_spawn_file_actions_destroy(&actions);
-    return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
-  }
+  int tessel(const std::vector<std::string>& arguments) { return runTessel(arguments).exitStatus; }
 };
 
 TEST_F(ContactsEndToEnd, AVirtualPlayerReceivesTheCardsAndASecondRunLeavesThemUntouched) {

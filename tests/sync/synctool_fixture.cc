@@ -254,6 +254,34 @@ SynctoolRun SynctoolTest::runSynctool(const std::vector<std::string>& arguments)
   return run;
 }
 
+SynctoolTest::TesselRun SynctoolTest::runTessel(const std::vector<std::string>& arguments) {
+  std::vector<std::string> words = {TESSEL_BINARY, "--store", (folder_ / "truth.db").string()};
+  words.insert(words.end(), arguments.begin(), arguments.end());
+  std::vector<char*> argv;
+  for (std::string& word : words) argv.push_back(word.data());
+  argv.push_back(nullptr);
+  const fs::path output = folder_ / "tessel.out";
+  TesselRun run;
+  pid_t pid = ::fork();
+  if (pid == 0) {
+    int fd = ::open(output.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
+    if (fd < 0) ::_exit(127);
+    ::dup2(fd, 1);
+    ::dup2(fd, 2);
+    ::execv(argv[0], argv.data());
+    ::_exit(127);
+  }
+  int status = 0;
+  if (pid > 0 && ::waitpid(pid, &status, 0) == pid && WIFEXITED(status)) {
+    run.exitStatus = WEXITSTATUS(status);
+  }
+  std::ifstream in(output, std::ios::binary);
+  std::ostringstream text;
+  text << in.rdbuf();
+  run.output = text.str();
+  return run;
+}
+
 LockHolder::LockHolder(const std::map<std::string, std::string>& environment,
                        std::uint64_t uniqueId) {
   int answer[2];

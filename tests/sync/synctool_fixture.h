@@ -120,6 +120,14 @@ class SynctoolTest : public ::testing::Test {
     return runSynctool({"--oneshot", "--sync", std::string(clientID)});
   }
 
+  // What one run of the `tessel` command gave.
+  struct TesselRun {
+    int exitStatus = -1;
+    std::string output;  // standard output and standard error together
+  };
+  // `tessel --store <the test's store> arguments...`, as the desktop application would run it.
+  TesselRun runTessel(const std::vector<std::string>& arguments);
+
  private:
   fs::path folder_;
   std::unique_ptr<tessel::Store> store_;
