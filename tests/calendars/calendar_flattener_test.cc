@@ -120,38 +120,6 @@ TEST_F(CalendarFlattenerTest, RelatedRecordsMissingFromTruthLeaveAnEmptyArray) {
                                    {tessel::TesselEntity_Calendars_Organizer, Array{}}}}));
 }
 
-TEST_F(CalendarFlattenerTest, DetachedOccurrencesAddTheirOriginalDatesOnlyFromThisCalendar) {
-  // No stored exception dates: the dates come after the related records.
-  put("master", Dictionary{{kEntity, kEvent},
-                           {"summary", "Standup"},
-                           {"detached events", ids({"moved-2", "elsewhere", "moved-1", "plain"})},
-                           {"recurrences", ids({"rule"})}});
-  put("rule",
-      Dictionary{{kEntity, tessel::TesselEntity_Calendars_Recurrence}, {"frequency", "daily"}});
-  put("moved-1", Dictionary{{kEntity, kEvent}, {"original date", "day 1"}});
-  put("moved-2", Dictionary{{kEntity, kEvent}, {"original date", "day 2"}});
-  put("plain", Dictionary{{kEntity, kEvent}});  // no original date: adds nothing
-  put("elsewhere", Dictionary{{kEntity, kEvent}, {"original date", "day 9"}});
-  // Only detached occurrences of other calendars: the dates stay as stored.
-  put("lonely", Dictionary{{kEntity, kEvent},
-                           {"exception dates", Array{Value("day 0")}},
-                           {"detached events", ids({"elsewhere"})}});
-
-  Dictionary flattened =
-      flatten(Dictionary{{"events", ids({"master", "moved-1", "moved-2", "plain", "lonely"})}});
-
-  const Array& events = *flattened.find(kEvent)->asArray();
-  ASSERT_EQ(events.size(), 5u);  // the occurrences are events of their own
-  // Events come in the snapshot's order: lonely, master, moved-1, moved-2, plain.
-  EXPECT_EQ(events[0], Value(Dictionary{{"exception dates", Array{Value("day 0")}}}));
-  EXPECT_EQ(events[1],
-            Value(Dictionary{{"summary", "Standup"},
-                             {tessel::TesselEntity_Calendars_Recurrence,
-                              Array{Dictionary{{"frequency", "daily"}}}},
-                             {"exception dates", Array{Value("day 2"), Value("day 1")}}}));
-  EXPECT_EQ(events[2], Value(Dictionary{{"original date", "day 1"}}));
-}
-
 TEST_F(CalendarFlattenerTest, TasksKeepOnlyTheirListAndRecordsOfOtherKindsAreLeftOut) {
   put("task", Dictionary{{kEntity, kTask},
                          {"due date", "tomorrow"},

@@ -1,10 +1,7 @@
 // The calendars half of a sync, end to end: the real zetosynctool on a store filled by the
 // real `tessel` command and a virtual player, judged by the files on the player, the
 // progress notifications and the log.
-#include <fcntl.h>
 #include <gtest/gtest.h>
-#include <spawn.h>
-#include <sys/wait.h>
 
 #include <fstream>
 #include <initializer_list>
@@ -13,8 +10,6 @@
 #include <vector>
 
 #include "sync/synctool_fixture.h"
-
-extern char** environ;
 
 namespace zt::sync::test_support {
 namespace {
@@ -311,6 +306,8 @@ TEST_F(CalendarsSync, ContactsAndCalendarsSyncTogetherInOneRun) {
   EXPECT_EQ(run.finalStatus(), 0) << run.log;
   EXPECT_TRUE(fs::exists(volume() / "Contacts" / "Tessel.vcf"));
   EXPECT_TRUE(contains(calendarFile("Tessel-Home.ics"), "SUMMARY:Lunch\r\n"));
+  EXPECT_EQ(run.dataClassesSyncing(),
+            (std::vector<std::string>{"tessel.contacts", "tessel.calendars"}));
   // Contacts go first; calendars follow in the same session.
   const auto contacts = run.lineIndex("Sync'ing Contacts");
   const auto calendars = run.lineIndex("Sync'ing Calendars");

@@ -1,10 +1,7 @@
 // The real programs on a virtual player: `tessel` fills the store and registers the client,
 // `zetosynctool` syncs, as the desktop application would run them.
-#include <fcntl.h>
 #include <gtest/gtest.h>
-#include <spawn.h>
 #include <sys/stat.h>
-#include <sys/wait.h>
 
 #include <string>
 #include <vector>

@@ -81,15 +81,7 @@ void ContactsSyncTest::TearDown() {
 }
 
 void ContactsSyncTest::put(std::string_view jsonLines) {
-  putRecords(tessel::parseRecordLines(jsonLines));
-}
-
-void ContactsSyncTest::putDataFile(std::string_view name) {
-  put(dataFile(name));
-}
-
-void ContactsSyncTest::putRecords(const std::vector<tessel::Record>& records) {
-  store_->putRecords(records);
+  store_->putRecords(tessel::parseRecordLines(jsonLines));
 }
 
 std::unique_ptr<tessel::Client> ContactsSyncTest::client() const {

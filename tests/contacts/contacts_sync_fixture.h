@@ -52,8 +52,6 @@ class ContactsSyncTest : public ::testing::Test {
 
   // Puts records given as typed JSON lines.
   void put(std::string_view jsonLines);
-  void putDataFile(std::string_view name);
-  void putRecords(const std::vector<tessel::Record>& records);
   std::unique_ptr<tessel::Client> client() const;
 
   using SyncerMaker = std::function<std::unique_ptr<sync::ContactsSyncing>(sync::ZTSyncManager&)>;

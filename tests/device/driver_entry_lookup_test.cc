@@ -86,20 +86,6 @@ TEST(DriverEntryLookup, ClimbsToTheFirstConformingAncestorReleasingTheOthers) {
   EXPECT_EQ(log.last(), "Found the matching Hwtree object");
 }
 
-TEST(DriverEntryLookup, OnlyTheGivenClassNamesCount) {
-  CapturedLog log;
-  TreeRegistry registry("com_kestro_driver_ZetoRBCNub");
-  std::optional<platform::RegistryEntry> driver;
-  EXPECT_FALSE(findDriverEntry(registry, "/dev/disk2s3",
-                               {"com_kestro_driver_ZetoNub", std::nullopt, std::nullopt}, &driver));
-  EXPECT_FALSE(driver);
-  EXPECT_TRUE(
-      log.has("Walking through service parents to find object conforming to "
-              "com_kestro_driver_ZetoNub/(null)/(null)"));
-  EXPECT_EQ(log.last(), "Error getting parent");
-  EXPECT_EQ(registry.liveReferences(), 0u);
-}
-
 TEST(DriverEntryLookup, NoConformingAncestorEndsAtTheRoot) {
   CapturedLog log;
   TreeRegistry registry("Nub");

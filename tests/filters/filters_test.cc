@@ -104,9 +104,6 @@ TEST_F(FiltersTest, FreshFiltersSelectEverythingAndDescribeThemselves) {
   std::snprintf(expected, sizeof expected, "Contact Filter %p: enableAll YES",
                 static_cast<const void*>(&contacts));
   EXPECT_EQ(contacts.description(), expected);
-  std::snprintf(expected, sizeof expected, "Calendar Filter %p: enableAll YES",
-                static_cast<const void*>(&calendars));
-  EXPECT_EQ(calendars.description(), expected);
 
   contacts.setUseAllContacts(false);
   contacts.setUsedContactGroups({ref("g1"), std::string("legacy-id")});
@@ -121,10 +118,6 @@ TEST_F(FiltersTest, FreshFiltersSelectEverythingAndDescribeThemselves) {
   ZetoContactFilter::setContactFilterHelper(&helper);
   EXPECT_TRUE(ZetoContactFilter().shouldApplyRecord(Dictionary{}, "x"));
   EXPECT_TRUE(helper.asked.empty());
-  EXPECT_EQ(ZetoContactFilter().supportedEntityNames(),
-            std::vector<std::string>{std::string(tessel::TesselEntity_Contacts_Contact)});
-  EXPECT_EQ(ZetoCalendarFilter().supportedEntityNames(),
-            std::vector<std::string>{std::string(tessel::TesselEntity_Calendars_Calendar)});
 }
 
 TEST_F(FiltersTest, ContactFilterAsksItsHelperGroupByGroup) {

@@ -95,8 +95,6 @@ TEST_F(DeviceLibraryTest, VirtualListsPlayersWithIdsAndMountPoints) {
   ASSERT_EQ(devices.size(), 3u);
   EXPECT_EQ(library.ZetoGetUniqueID(devices[0]), 0xA27001A2B3C4DULL);
   EXPECT_EQ(library.ZetoGetUniqueID(devices[1]), 0x1A2BULL);
-  EXPECT_EQ(library.ZetoGetUniqueID(devices[2]), 0xFULL);
-  EXPECT_FALSE(devices[0] == devices[1]);
 
   std::string path = "unchanged";
   EXPECT_EQ(library.ZetoCopyMountpoint(devices[0], path), kZetoSuccess);
@@ -110,7 +108,6 @@ TEST_F(DeviceLibraryTest, VirtualListsPlayersWithIdsAndMountPoints) {
     EXPECT_EQ(path, "unchanged");
     EXPECT_EQ(library.mountedFromDevice(unmounted), std::nullopt);
   }
-  EXPECT_EQ(library.checkpoint(devices[1]), std::nullopt);
 
   // A second listing gives references equal to the first.
   std::vector<ZetoRef> again;
@@ -154,24 +151,6 @@ TEST_F(DeviceLibraryTest, VirtualLateMountArrivesAsAttachedThenMountedInTheRegis
   EXPECT_EQ(loop.runInMode("ZetoMode", 0.1, ReturnAfter::SourceHandled), RunResult::NoSources);
 }
 
-TEST_F(DeviceLibraryTest, VirtualPlayerThatNeverMountsLetsTheWaitTimeOut) {
-  RunLoop loop;
-  VirtualDeviceLibrary library(
-      writeDeviceFile(R"([{"id": "F", "volume": ")" + volume() + R"(", "mounted": false}])"));
-  std::vector<ZetoRef> devices;
-  ASSERT_EQ(library.ZetoCopyConnected(devices), kZetoSuccess);
-  Receiver receiver;
-  ASSERT_EQ(library.ZetoRegisterWithServer(loop, "ZetoMode", &Receiver::callback, &receiver),
-            kZetoSuccess);
-  auto start = RunLoop::Clock::now();
-  // The registration itself is a source of the mode: the wait lasts its full time.
-  EXPECT_EQ(loop.runInMode("ZetoMode", 0.3, ReturnAfter::SourceHandled), RunResult::TimedOut);
-  EXPECT_GE(std::chrono::duration<double>(RunLoop::Clock::now() - start).count(), 0.3);
-  EXPECT_TRUE(receiver.events.empty());
-  std::string path;
-  EXPECT_EQ(library.ZetoCopyMountpoint(devices[0], path), kZetoErrorNotMounted);
-}
-
 TEST_F(DeviceLibraryTest, VirtualUnregisterStopsDelivery) {
   RunLoop loop;
   VirtualDeviceLibrary library(threePlayers(0.1));
@@ -200,16 +179,10 @@ TEST_F(DeviceLibraryTest, VirtualMalformedFilesAreErrorsWithAReasonInTheLog) {
   const std::vector<std::pair<std::string, std::string>> cases = {
       {"[{\"id\": ", "not JSON"},
       {R"({"id": "F", "volume": "/v"})", "not an array"},
-      {R"(["F"])", "entry 0: not an object"},
       {R"([{"volume": "/v"}])", "\"id\" is missing"},
-      {R"([{"id": 15, "volume": "/v"}])", "\"id\" is missing or not a text"},
-      {R"([{"id": "12345678901234567", "volume": "/v"}])", "hexadecimal"},
-      {R"([{"id": "", "volume": "/v"}])", "hexadecimal"},
       {R"([{"id": "0x1F", "volume": "/v"}])", "hexadecimal"},
       {R"([{"id": "F", "volume": "/v"}, {"id": "E"}])", "entry 1: \"volume\""},
-      {R"([{"id": "F", "volume": "/v", "mounted": "yes"}])", "\"mounted\""},
       {R"([{"id": "F", "volume": "/v", "mount_after": -1}])", "\"mount_after\""},
-      {R"([{"id": "F", "volume": "/v", "checkpoint": 3}])", "\"checkpoint\""},
   };
   for (std::size_t i = 0; i < cases.size(); ++i) {
     const auto& [json, reason] = cases[i];
@@ -233,34 +206,6 @@ TEST_F(DeviceLibraryTest, VirtualMalformedFilesAreErrorsWithAReasonInTheLog) {
   VirtualDeviceLibrary missing((dir_ / "absent.json").string());
   std::vector<ZetoRef> devices;
   EXPECT_EQ(missing.ZetoCopyConnected(devices), kZetoErrorBadDeviceFile);
-}
-
-TEST(VirtualPlayers, MountedFollowsMountAfterUnlessGiven) {
-  std::string whyNot;
-  auto players = parseVirtualPlayers(R"([
-      {"id": "a", "volume": "/v"},
-      {"id": "b", "volume": "/v", "mount_after": 2},
-      {"id": "c", "volume": "/v", "mount_after": 0.5, "mounted": true},
-      {"id": "ffffffffffffffff", "volume": "/v", "mounted": false, "extra": 1}])",
-                                     whyNot);
-  ASSERT_TRUE(players) << whyNot;
-  ASSERT_EQ(players->size(), 4u);
-  EXPECT_TRUE((*players)[0].mounted);
-  EXPECT_FALSE((*players)[0].mountAfter);
-  EXPECT_FALSE((*players)[1].mounted);
-  EXPECT_EQ((*players)[1].mountAfter, 2.0);
-  EXPECT_TRUE((*players)[2].mounted);
-  EXPECT_EQ((*players)[3].uniqueId, UINT64_MAX);
-  EXPECT_FALSE((*players)[3].mounted);
-  EXPECT_TRUE(parseVirtualPlayers("[]", whyNot).has_value());
-}
-
-TEST(VirtualPlayers, DeviceNodesNameTheirIndex) {
-  EXPECT_EQ(virtualDeviceNode(0), "/dev/zetovirt0");
-  EXPECT_EQ(virtualPlayerIndexOfNode(virtualDeviceNode(12)), 12u);
-  EXPECT_EQ(virtualPlayerIndexOfNode("/dev/zetovirt"), std::nullopt);
-  EXPECT_EQ(virtualPlayerIndexOfNode("/dev/zetovirt1s1"), std::nullopt);
-  EXPECT_EQ(virtualPlayerIndexOfNode("/dev/sdb1"), std::nullopt);
 }
 
 // Runs `body` in a child process and returns its exit status.
@@ -303,7 +248,7 @@ TEST_F(DeviceLibraryTest, LockIsExclusiveAcrossProcessesUntilReleased) {
   EXPECT_EQ(library.ZetoReleaseLock(devices[2]), kZetoErrorNotLocked);
 }
 
-TEST_F(DeviceLibraryTest, LockIsSharedWithEveryBackendByIdentifier) {
+TEST_F(DeviceLibraryTest, LockIsSharedByIdentifierAndDiesWithItsHolder) {
   VirtualDeviceLibrary library(threePlayers());
   std::vector<ZetoRef> devices;
   ASSERT_EQ(library.ZetoCopyConnected(devices), kZetoSuccess);
@@ -311,12 +256,6 @@ TEST_F(DeviceLibraryTest, LockIsSharedWithEveryBackendByIdentifier) {
   // The linux backend locks by the same identifier text.
   EXPECT_EQ(inChild([] { return DeviceLocks().acquire(0x1A2B) == kZetoErrorLockBusy ? 0 : 1; }), 0);
   EXPECT_EQ(inChild([] { return DeviceLocks().acquire(0x1A2C) == kZetoSuccess ? 0 : 1; }), 0);
-}
-
-TEST_F(DeviceLibraryTest, LockDiesWithItsHolder) {
-  VirtualDeviceLibrary library(threePlayers());
-  std::vector<ZetoRef> devices;
-  ASSERT_EQ(library.ZetoCopyConnected(devices), kZetoSuccess);
   // A holder that ends without releasing leaves the player free.
   EXPECT_EQ(inChild([] {
               auto* leaked = new DeviceLocks();  // never destroyed: the process just ends

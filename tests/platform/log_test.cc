@@ -26,20 +26,15 @@ TEST(LogFormat, ConversionEndsAtItsLetter) {
   EXPECT_EQ(Log::format("count %ul", {42u}), "count 42l");
   EXPECT_EQ(Log::format("%lu|%llu|%zu|%hhu|%qu|%ju|%tu", {1u, 2u, std::size_t{3}, 4u, 5u, 6u, 7u}),
             "1|2|3|4|5|6|7");
-  EXPECT_EQ(Log::format("%llX", {std::uint64_t{0xA27001A2B3C4DULL}}), "A27001A2B3C4D");
   EXPECT_EQ(Log::format("%016llX", {std::uint64_t{0xA27001A2B3C4DULL}}), "000A27001A2B3C4D");
-  EXPECT_EQ(Log::format("%02lx:%02lx", {5, 0xab}), "05:ab");
 }
 
 TEST(LogFormat, NumbersKeepFlagsWidthAndPrecision) {
   EXPECT_EQ(Log::format("%d %i %o %#x %X", {-3, 12, 8, 255, 255}), "-3 12 10 0xff FF");
   EXPECT_EQ(Log::format("[%5d][%-5d][%+d][% d][%05d][%.4d]", {42, 42, 42, 42, -42, 7}),
             "[   42][42   ][+42][ 42][-0042][0007]");
-  EXPECT_EQ(Log::format("%lld %llu", {INT64_MIN, UINT64_MAX}),
-            "-9223372036854775808 18446744073709551615");
   // Signed and unsigned arguments are reinterpreted as C would.
   EXPECT_EQ(Log::format("%u %d", {-1, UINT64_MAX}), "18446744073709551615 -1");
-  EXPECT_EQ(Log::format("%d%d %c%c", {true, false, 'O', 75}), "10 OK");
   EXPECT_EQ(Log::format("%f %.2f %8.3f|%e %g", {1.5, 3.14159, 2.5, 12345.678, 0.0001}),
             "1.500000 3.14    2.500|1.234568e+04 0.0001");
   // An integer given for a real conversion is converted, not reinterpreted.
@@ -51,42 +46,29 @@ TEST(LogFormat, TextsPointersAndDescriptions) {
   EXPECT_EQ(Log::format("[%6s][%-6s][%.2s]", {"ab", "ab", "abcdef"}), "[    ab][ab    ][ab]");
   EXPECT_EQ(Log::format("%s", {static_cast<const char*>(nullptr)}), "(null)");
   EXPECT_EQ(Log::format("%p", {reinterpret_cast<const void*>(0x1234)}), "0x1234");
-  EXPECT_EQ(Log::format("%p", {static_cast<const void*>(nullptr)}), "(nil)");
   EXPECT_EQ(Log::format("value %@.", {Described{}}), "value <Described 7>.");
-  EXPECT_EQ(Log::format("%@", {std::string_view("view")}), "view");
   // Embedded NULs of a description survive a plain "%@".
   EXPECT_EQ(Log::format("%@", {std::string("a\0b", 3)}), std::string("a\0b", 3));
 }
 
-TEST(LogFormat, PercentAndMalformedConversions) {
+TEST(LogFormat, PercentMalformedConversionsAndMismatchedArguments) {
   EXPECT_EQ(Log::format("100%% done", {}), "100% done");
-  EXPECT_EQ(Log::format("%%d", {5}), "%d");
   EXPECT_EQ(Log::format("trailing %", {}), "trailing %");
   EXPECT_EQ(Log::format("trailing %5l", {1}), "trailing %5l");
   // Unknown conversions, "%n" among them, are printed as text and take no argument.
   EXPECT_EQ(Log::format("%k %n %d", {9}), "%k %n 9");
-  EXPECT_EQ(Log::format("no conversions", {1, 2}), "no conversions");
-}
-
-TEST(LogFormat, MismatchedArgumentsNeverCrash) {
+  // Mismatched arguments never crash.
   EXPECT_EQ(Log::format("%s", {42}), "42");
-  EXPECT_EQ(Log::format("%@ %@", {7, 2.5}), "7 2.5");
   EXPECT_EQ(Log::format("%d", {"text"}), "text");
-  EXPECT_EQ(Log::format("%f", {"text"}), "text");
   EXPECT_EQ(Log::format("%x", {reinterpret_cast<const void*>(0xbeef)}), "beef");
-  EXPECT_EQ(Log::format("%p", {0x10}), "0x10");
-  EXPECT_EQ(Log::format("%s", {reinterpret_cast<const void*>(0x10)}), "0x10");
-  EXPECT_EQ(Log::format("%c", {"xyz"}), "xyz");
   // Missing arguments print nothing, or "(null)" for texts; extra ones are ignored.
   EXPECT_EQ(Log::format("[%d][%s][%@][%f]", {}), "[][(null)][(null)][]");
-  EXPECT_EQ(Log::format("%d then %d", {1}), "1 then ");
   EXPECT_EQ(Log::format("%d", {1, "extra", 3.0}), "1");
 }
 
 TEST(LogFormat, WideConversionsAreNotTruncated) {
   const std::string longText(5000, 'x');
   EXPECT_EQ(Log::format("<%s>", {longText}), "<" + longText + ">");
-  EXPECT_EQ(Log::format("<%5000s>", {"y"}), "<" + std::string(4999, ' ') + "y>");
 }
 
 // Sends the log to a fresh file for the duration of a test and restores everything after.
@@ -168,9 +150,8 @@ TEST_F(LogSinkTest, ConfigurationSwitchesBetweenSinks) {
   EXPECT_EQ(testing::internal::GetCapturedStderr(), "three\n");
   EXPECT_EQ(contents(), "one\n");
   EXPECT_EQ(readFile(other), "two\n");
-}
 
-TEST_F(LogSinkTest, UnopenableFileFallsBackToStandardError) {
+  // A file that cannot be opened falls back to standard error.
   useSink((dir_ / "missing" / "tool.log").string());
   testing::internal::CaptureStderr();
   Log::always("still %s", "visible");
@@ -182,9 +163,7 @@ TEST_F(LogSinkTest, StandardErrorLinesAlsoGoToTheLog) {
   Log::standardError("cannot translate %@", Described{});
   EXPECT_EQ(testing::internal::GetCapturedStderr(), "cannot translate <Described 7>\n");
   EXPECT_EQ(contents(), "cannot translate <Described 7>\n");
-}
-
-TEST_F(LogSinkTest, StandardErrorLinesAreWrittenOnceWhenTheLogIsStandardError) {
+  // Written once when the log is standard error itself.
   useSink("stderr");
   testing::internal::CaptureStderr();
   Log::standardError("once");

@@ -17,33 +17,6 @@ namespace {
 using test_support::ScopedEnvironment;
 using test_support::TemporaryFolder;
 
-std::string contentsOf(const std::filesystem::path& path) {
-  std::ifstream file(path, std::ios::binary);
-  return std::string(std::istreambuf_iterator<char>(file), {});
-}
-
-Dictionary progress(std::string_view phase, double percent) {
-  Dictionary userInfo;
-  userInfo.set("TesselClientCurrentPhase", Value(phase));
-  userInfo.set("TesselClientPercentProgressionPhase", Value::real(percent));
-  return userInfo;
-}
-
-TEST(NotificationLog, LinesKeepKeyOrderAndValueKinds) {
-  Dictionary userInfo;
-  userInfo.set("TesselClientCurrentPhase", "TesselClientDisconnectingPhase");
-  userInfo.set("TesselClientStatus", Value::integer(3));
-  userInfo.set("TesselClientDataClassSyncing",
-               Value(Array{"TesselDataClass_Contacts", "TesselDataClass_Calendars"}));
-  userInfo.set("TesselClientPercentProgressionPhase", Value::real(100.0));
-  EXPECT_EQ(NotificationLog::jsonLine("TesselClientSyncNotification", "000A27001A2B3C4D", userInfo),
-            R"({"name":"TesselClientSyncNotification","object":"000A27001A2B3C4D",)"
-            R"("userInfo":{"TesselClientCurrentPhase":"TesselClientDisconnectingPhase",)"
-            R"("TesselClientStatus":3,"TesselClientDataClassSyncing":)"
-            R"(["TesselDataClass_Contacts","TesselDataClass_Calendars"],)"
-            R"("TesselClientPercentProgressionPhase":100.0}})");
-}
-
 TEST(NotificationLog, EveryValueKindHasAJsonForm) {
   Dictionary nested;
   nested.set("z", Value::boolean(true));
@@ -64,31 +37,6 @@ TEST(NotificationLog, EveryValueKindHasAJsonForm) {
             R"("nothing":{},"nested":{"z":true,"a":false},"mixed":[1,"two",0.25],)"
             R"("url":"file:///Volumes/ZETO","bytes":"<0aff>","notANumber":null,)"
             "\"broken\":\"caf\xEF\xBF\xBD\"}}");
-}
-
-TEST(NotificationLog, TheCenterAppendsOneLinePerPostWithoutABus) {
-  TemporaryFolder folder;
-  const auto log = folder / "notifications.jsonl";
-  std::ofstream(log) << "earlier line\n";
-  ScopedEnvironment environment;
-  environment.set("TESSEL_NOTIFICATIONS_LOG", log.string());
-  // A bus address that refuses: posting goes on without it.
-  environment.set("DBUS_SESSION_BUS_ADDRESS", "unix:path=" + (folder / "no-bus").string());
-
-  DbusNotificationCenter center;
-  center.post("TesselClientSyncNotification", "ABC", progress("TesselClientConnectingPhase", 0));
-  center.post("TesselClientSyncNotification", "ABC", progress("TesselClientMinglingPhase", 83.5));
-
-  EXPECT_EQ(contentsOf(log),
-            "earlier line\n"
-            R"({"name":"TesselClientSyncNotification","object":"ABC","userInfo":)"
-            R"({"TesselClientCurrentPhase":"TesselClientConnectingPhase",)"
-            R"("TesselClientPercentProgressionPhase":0.0}})"
-            "\n"
-            R"({"name":"TesselClientSyncNotification","object":"ABC","userInfo":)"
-            R"({"TesselClientCurrentPhase":"TesselClientMinglingPhase",)"
-            R"("TesselClientPercentProgressionPhase":83.5}})"
-            "\n");
 }
 
 TEST(NotificationLog, NoLogFileWithoutTheVariableOrWhereItCannotBeWritten) {

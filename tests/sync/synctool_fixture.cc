@@ -181,67 +181,77 @@ std::map<std::string, std::string> SynctoolTest::environment() const {
   return env;
 }
 
-SynctoolRun SynctoolTest::runSynctool(const std::vector<std::string>& arguments) {
-  const fs::path logPath = folder_ / "log.txt";
-  const fs::path notesPath = folder_ / "notes.jsonl";
-  const fs::path errPath = folder_ / "stderr.txt";
-  std::error_code ignored;
-  fs::remove(logPath, ignored);
-  fs::remove(notesPath, ignored);
+namespace {
 
+// Runs `words` with `environment` (none: this process's), standard input from /dev/null and
+// standard output and error into `output`, killing it after kRunDeadline; its exit status,
+// 128 + signal when it was killed.
+int runProgram(std::vector<std::string> words, std::optional<std::vector<std::string>> environment,
+               const fs::path& output) {
   // Everything the child needs is made before the fork.
-  std::vector<std::string> args = {ZETOSYNCTOOL_BINARY};
-  args.insert(args.end(), arguments.begin(), arguments.end());
-  std::vector<char*> argv;
-  for (std::string& arg : args) argv.push_back(arg.data());
+  std::vector<char*> argv, envp;
+  for (std::string& word : words) argv.push_back(word.data());
   argv.push_back(nullptr);
-  std::vector<std::string> env;
-  for (const auto& [name, value] : environment()) env.push_back(name + "=" + value);
-  std::vector<char*> envp;
-  for (std::string& entry : env) envp.push_back(entry.data());
-  envp.push_back(nullptr);
-  const std::string errFile = errPath.string();
-
-  SynctoolRun run;
+  if (environment) {
+    for (std::string& entry : *environment) envp.push_back(entry.data());
+    envp.push_back(nullptr);
+  }
+  const std::string outFile = output.string();
   const auto start = std::chrono::steady_clock::now();
   const pid_t pid = ::fork();
-  if (pid < 0) {
-    ADD_FAILURE() << "fork failed";
-    return run;
-  }
   if (pid == 0) {
     const int in = ::open("/dev/null", O_RDONLY);
-    const int err = ::open(errFile.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
+    const int out = ::open(outFile.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
     if (in >= 0) ::dup2(in, STDIN_FILENO);
-    if (err >= 0) {
-      ::dup2(err, STDOUT_FILENO);
-      ::dup2(err, STDERR_FILENO);
+    if (out >= 0) {
+      ::dup2(out, STDOUT_FILENO);
+      ::dup2(out, STDERR_FILENO);
     }
-    ::execve(argv[0], argv.data(), envp.data());
+    if (environment) {
+      ::execve(argv[0], argv.data(), envp.data());
+    } else {
+      ::execv(argv[0], argv.data());
+    }
     ::_exit(127);
   }
-
+  if (pid < 0) {
+    ADD_FAILURE() << "fork failed";
+    return -1;
+  }
   int status = 0;
-  for (;;) {
-    const pid_t done = ::waitpid(pid, &status, WNOHANG);
-    if (done == pid) break;
-    if (done < 0 && errno != EINTR) {
-      ADD_FAILURE() << "waitpid failed";
-      return run;
-    }
+  while (::waitpid(pid, &status, WNOHANG) != pid) {
     if (std::chrono::steady_clock::now() - start > kRunDeadline) {
       ::kill(pid, SIGKILL);
       ::waitpid(pid, &status, 0);
-      ADD_FAILURE() << "zetosynctool did not end in time and was killed";
+      ADD_FAILURE() << words[0] << " did not end in time and was killed";
       break;
     }
     std::this_thread::sleep_for(std::chrono::milliseconds(10));
   }
+  return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+}
+
+}  // namespace
+
+SynctoolRun SynctoolTest::runSynctool(const std::vector<std::string>& arguments) {
+  const fs::path logPath = folder_ / "log.txt";
+  const fs::path notesPath = folder_ / "notes.jsonl";
+  std::error_code ignored;
+  fs::remove(logPath, ignored);
+  fs::remove(notesPath, ignored);
+
+  std::vector<std::string> words = {ZETOSYNCTOOL_BINARY};
+  words.insert(words.end(), arguments.begin(), arguments.end());
+  std::vector<std::string> env;
+  for (const auto& [name, value] : environment()) env.push_back(name + "=" + value);
+
+  SynctoolRun run;
+  const auto start = std::chrono::steady_clock::now();
+  run.exitStatus = runProgram(std::move(words), std::move(env), folder_ / "stderr.txt");
   run.seconds = std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
-  run.exitStatus = WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
   run.log = readFile(logPath);
   run.logLines = splitLines(run.log);
-  run.standardError = readFile(errPath);
+  run.standardError = readFile(folder_ / "stderr.txt");
   for (const std::string& line : splitLines(readFile(notesPath))) {
     if (line.empty()) continue;
     Json parsed = Json::parse(line, nullptr, false);
@@ -257,63 +267,33 @@ SynctoolRun SynctoolTest::runSynctool(const std::vector<std::string>& arguments)
 SynctoolTest::TesselRun SynctoolTest::runTessel(const std::vector<std::string>& arguments) {
   std::vector<std::string> words = {TESSEL_BINARY, "--store", (folder_ / "truth.db").string()};
   words.insert(words.end(), arguments.begin(), arguments.end());
-  std::vector<char*> argv;
-  for (std::string& word : words) argv.push_back(word.data());
-  argv.push_back(nullptr);
-  const fs::path output = folder_ / "tessel.out";
   TesselRun run;
-  pid_t pid = ::fork();
-  if (pid == 0) {
-    int fd = ::open(output.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
-    if (fd < 0) ::_exit(127);
-    ::dup2(fd, 1);
-    ::dup2(fd, 2);
-    ::execv(argv[0], argv.data());
-    ::_exit(127);
-  }
-  int status = 0;
-  if (pid > 0 && ::waitpid(pid, &status, 0) == pid && WIFEXITED(status)) {
-    run.exitStatus = WEXITSTATUS(status);
-  }
-  std::ifstream in(output, std::ios::binary);
-  std::ostringstream text;
-  text << in.rdbuf();
-  run.output = text.str();
+  run.exitStatus = runProgram(std::move(words), std::nullopt, folder_ / "tessel.out");
+  run.output = readFile(folder_ / "tessel.out");
   return run;
 }
 
 LockHolder::LockHolder(const std::map<std::string, std::string>& environment,
                        std::uint64_t uniqueId) {
-  int answer[2];
-  int release[2];
-  if (::pipe2(answer, O_CLOEXEC) != 0) {
-    ADD_FAILURE() << "pipe failed";
-    return;
-  }
-  if (::pipe2(release, O_CLOEXEC) != 0) {
-    ::close(answer[0]);
-    ::close(answer[1]);
+  int answer[2], release[2];
+  if (::pipe2(answer, O_CLOEXEC) != 0 || ::pipe2(release, O_CLOEXEC) != 0) {
     ADD_FAILURE() << "pipe failed";
     return;
   }
   pid_ = ::fork();
   if (pid_ == 0) {
-    ::close(answer[0]);
-    ::close(release[1]);
     for (const auto& [name, value] : environment) ::setenv(name.c_str(), value.c_str(), 1);
     std::int32_t result = platform::kZetoErrorNoSuchDevice;
     std::unique_ptr<platform::DeviceLibrary> library = platform::makeDeviceLibrary();
     std::vector<platform::ZetoRef> devices;
     if (library->ZetoCopyConnected(devices) == platform::kZetoSuccess) {
       for (platform::ZetoRef device : devices) {
-        if (library->ZetoGetUniqueID(device) == uniqueId) {
-          result = library->ZetoAquireLock(device);
-          break;
-        }
+        if (library->ZetoGetUniqueID(device) == uniqueId) result = library->ZetoAquireLock(device);
       }
     }
     if (::write(answer[1], &result, sizeof result) != sizeof result) ::_exit(1);
     // Holds the lock until the test closes its end of the pipe (or dies).
+    ::close(release[1]);
     char byte;
     while (::read(release[0], &byte, 1) < 0 && errno == EINTR) {
     }
@@ -322,17 +302,8 @@ LockHolder::LockHolder(const std::map<std::string, std::string>& environment,
   ::close(answer[1]);
   ::close(release[0]);
   release_ = release[1];
-  if (pid_ < 0) {
-    ADD_FAILURE() << "fork failed";
-    ::close(answer[0]);
-    return;
-  }
   std::int32_t result = 0;
-  ssize_t got;
-  do {
-    got = ::read(answer[0], &result, sizeof result);
-  } while (got < 0 && errno == EINTR);
-  if (got == sizeof result) result_ = result;
+  if (pid_ > 0 && ::read(answer[0], &result, sizeof result) == sizeof result) result_ = result;
   ::close(answer[0]);
 }
 

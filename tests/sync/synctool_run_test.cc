@@ -17,18 +17,6 @@ const std::string kMingling = "TesselClientMinglingPhase";
 const std::string kUploading = "TesselClientUploadingPhase";
 const std::string kDisconnecting = "TesselClientDisconnectingPhase";
 
-struct DataClass {
-  std::string name;
-  std::string leftOutLine;
-  std::string syncingLine;
-};
-const DataClass kDataClasses[] = {
-    {"tessel.contacts", "No contacts syncer in this tool, contacts are left out of this sync",
-     "Sync'ing Contacts"},
-    {"tessel.calendars", "No calendars syncer in this tool, calendars are left out of this sync",
-     "Sync'ing Calendars"},
-};
-
 using CommandLine = SynctoolTest;
 
 TEST_F(CommandLine, WithoutAnIdentifierOnlyTheUsageLineIsLoggedAndTheExitStatusIsOne) {
@@ -36,8 +24,6 @@ TEST_F(CommandLine, WithoutAnIdentifierOnlyTheUsageLineIsLoggedAndTheExitStatusI
   setDebugLog(false);
   const std::vector<std::vector<std::string>> badArguments = {
       {},
-      {"--oneshot", "--sync"},
-      {"--oneshot"},
       {"--oneshot", std::string(kClientID)},  // an identifier without "--sync" is just an argument
       {"--SYNC", std::string(kClientID)},     // the option is case-sensitive
   };
@@ -66,26 +52,6 @@ TEST_F(CommandLine, TheLastSyncValueWinsAndEveryOtherArgumentIsIgnored) {
   for (const Json& note : run.notifications) EXPECT_EQ(note["object"], kClientID);
   EXPECT_EQ(run.finalStatus(), 0);
   EXPECT_TRUE(client(kClientID)->lastSession().has_value());
-
-  // The value after "--sync" is never itself read as an option.
-  const SynctoolRun twice = runSynctool({"--sync", "--sync"});
-  EXPECT_EQ(twice.exitStatus, 0);
-  EXPECT_TRUE(twice.logged("Starting sync for Zeto with ID --sync")) << twice.log;
-  ASSERT_FALSE(twice.notifications.empty());
-  EXPECT_EQ(twice.notifications.back()["object"], "--sync");
-}
-
-TEST_F(CommandLine, WithoutDebugLoggingASuccessfulRunWritesNoLogLine) {
-  registerClient(kClientID, false, false);
-  setDebugLog(false);
-  const SynctoolRun run = syncClient(kClientID);
-  EXPECT_EQ(run.exitStatus, 0);
-  EXPECT_EQ(run.log, "");
-  EXPECT_EQ(run.standardError, "");
-  EXPECT_EQ(run.notifications.size(), 5u);
-  EXPECT_EQ(run.finalStatus(), 0);
-  EXPECT_TRUE(fs::is_directory(volume() / "Contacts"));
-  EXPECT_TRUE(fs::is_directory(volume() / "Calendars"));
 }
 
 using RunOutcome = SynctoolTest;
@@ -125,23 +91,6 @@ TEST_F(RunOutcome, AClientSyncingNeitherClassGoesThroughEveryPhaseAndFinishesIts
   EXPECT_TRUE(run.logged("Unlocking Zeto"));
 }
 
-TEST_F(RunOutcome, TheDataClassListNamesEveryEnabledClassThisToolCanSync) {
-  registerClient(kClientID, true, true);
-  const SynctoolRun run = syncClient(kClientID);
-  EXPECT_EQ(run.exitStatus, 0);
-  EXPECT_EQ(run.finalStatus(), 0) << run.log;
-  // A class whose syncer this build lacks is left out with a line saying so, is not in the
-  // list, and nothing claims to have synced it.
-  std::vector<std::string> expected;
-  for (const DataClass& dataClass : kDataClasses) {
-    SCOPED_TRACE(dataClass.name);
-    const bool leftOut = run.logged(dataClass.leftOutLine);
-    if (!leftOut) expected.push_back(dataClass.name);
-    EXPECT_EQ(run.logged(dataClass.syncingLine), !leftOut);
-  }
-  EXPECT_EQ(run.dataClassesSyncing(), expected);
-}
-
 TEST_F(RunOutcome, WithoutTheMatchingPlayerTheRunReportsStatusThreeAndBeginsNoSession) {
   registerClient(kClientID, true, true);
   setPlayers({Player("BEEF")});
@@ -158,12 +107,6 @@ TEST_F(RunOutcome, WithoutTheMatchingPlayerTheRunReportsStatusThreeAndBeginsNoSe
   EXPECT_FALSE(run.logged("Cleaning sync session"));
   EXPECT_FALSE(run.logged("Locking Zeto"));
   EXPECT_FALSE(fs::exists(volume() / "Contacts"));
-
-  // No players at all: the same.
-  setDevicesFile("[]");
-  const SynctoolRun none = syncClient(kClientID);
-  EXPECT_EQ(none.notifications, expected);
-  EXPECT_FALSE(client(kClientID)->lastSession().has_value());
 }
 
 TEST_F(RunOutcome, AnUnknownClientEndsTheRunWithStatusZeroBeforeThePlayerIsTouched) {

