@@ -10,7 +10,7 @@
 #include "tessel/import_error.h"
 #include "tessel/store.h"
 // SyncDeletes, which both importers take, is declared with the vCard importer.
-#include "tessel/vcard_import.h"
+#include "tessel/import_options.h"
 
 namespace tessel {
 

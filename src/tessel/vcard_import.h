@@ -7,15 +7,12 @@
 #include <string_view>
 #include <vector>
 
+#include "tessel/import_options.h"
 #include "tessel/record.h"
 #include "tessel/store.h"
 #include "tessel/vcard_contact.h"
 
 namespace tessel {
-
-// Whether an import also deletes the records of earlier vCard imports that it no longer
-// produces (contacts gone from the source, their related records, groups).
-enum class SyncDeletes { Off, On };
 
 struct VCardImportSummary {
   std::size_t contacts = 0;
@@ -55,7 +52,7 @@ class VCardImport {
   // contacts under "members".
   std::vector<Record> records() const;
 
-  // Writes records() in one transaction; then deletes, in a second one, related records the
+  // Writes records() and, in the same transaction, deletes the related records the
   // imported contacts no longer have and, with SyncDeletes::On, every other record of an
   // earlier vCard import that this one does not produce. Without SyncDeletes::On, a group
   // keeps the members that earlier imports gave it and that this import did not read again.
