@@ -35,9 +35,9 @@ bool ZTContactsSyncer::disassembleData() {
         {{tessel::TesselRecordEntityNameKey, std::string(tessel::TesselEntity_Contacts_Contact)}});
     Log::debug("Truth contains %ul contacts", contacts.size());
 
-    VCardWriter writer(*snapshot, _syncManager.shouldSyncContactImages()
-                                      ? &ContactPhotoPreparation::shared()
-                                      : nullptr);
+    VCardWriter writer(*snapshot, [this]() -> ContactPhotoPreparation* {
+      return _syncManager.shouldSyncContactImages() ? &ContactPhotoPreparation::shared() : nullptr;
+    });
     tessel::Session& session = *_syncManager.syncSession();
     std::string card;
     std::size_t written = 0;

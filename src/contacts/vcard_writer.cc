@@ -78,8 +78,8 @@ std::string_view imType(std::string_view type) {
 
 }  // namespace
 
-VCardWriter::VCardWriter(const tessel::Snapshot& snapshot, ContactPhotoPreparation* photos)
-    : snapshot_(snapshot), photos_(photos) {}
+VCardWriter::VCardWriter(const tessel::Snapshot& snapshot, PhotoSource photos)
+    : snapshot_(snapshot), photos_(std::move(photos)) {}
 
 void VCardWriter::appendEscaped(std::string& card, const platform::Value* value) {
   const std::string* text = textOf(value);
@@ -104,7 +104,8 @@ void VCardWriter::appendCard(std::string& card, const platform::Dictionary& cont
     appendEscaped(card, note);
     card += "\r\n";
   }
-  if (photos_) photos_->appendPhoto(card, contact);
+  if (ContactPhotoPreparation* photos = photos_ ? photos_() : nullptr)
+    photos->appendPhoto(card, contact);
   categories_.clear();
   appendRelated(card, contact);
   appendCategories(card);

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -15,8 +16,12 @@ namespace zt::contacts {
 // in the order the snapshot yields them, and CATEGORIES from the contact's groups.
 class VCardWriter {
  public:
-  // Photos are embedded through `photos` when one is given.
-  VCardWriter(const tessel::Snapshot& snapshot, ContactPhotoPreparation* photos);
+  // Asked once per card: the preparation that embeds the card's photo, or none when photos
+  // stay off the player. Asking per card rather than once up front means that a run which
+  // writes no card never has to decide, and so never probes the player.
+  using PhotoSource = std::function<ContactPhotoPreparation*()>;
+
+  VCardWriter(const tessel::Snapshot& snapshot, PhotoSource photos);
 
   void appendCard(std::string& card, const platform::Dictionary& contact);
 
@@ -33,7 +38,7 @@ class VCardWriter {
   void appendCategories(std::string& card);
 
   const tessel::Snapshot& snapshot_;
-  ContactPhotoPreparation* photos_;
+  PhotoSource photos_;
   // Reused by every value and every card.
   std::string escaped_;
   std::vector<std::string> categories_;

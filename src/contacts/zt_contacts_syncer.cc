@@ -124,7 +124,10 @@ bool ZTContactsSyncer::fileOnZetoNeedsPush() {
     Log::debug("Can't get VCF attributes on Zeto, force pushing VCF");
     return true;
   }
-  if (!(*saved == platform::Value(*date))) {
+  // The stored date and the file's are compared as instants: a date that names the same
+  // instant at another UTC offset (set by hand, say) is the same date.
+  const platform::CalendarDate* savedDate = saved->asDate();
+  if (!savedDate || !savedDate->isSameInstant(*date)) {
     Log::debug("Last mod date of VCF on Zeto is not the one we saved, force pushing VCF");
     return true;
   }

@@ -88,6 +88,19 @@ TEST_F(PushDecision, AFileTouchedBehindOurBackIsPushed) {
   EXPECT_TRUE(sync().logged("Nothing to push for contacts..."));
 }
 
+TEST_F(PushDecision, TheSavedDateIsComparedAsAnInstant) {
+  settle();
+  // The same instant as the stored GMT date, written at another UTC offset (as a date set by
+  // hand with an offset would be stored).
+  const std::optional<platform::Value> saved = client()->setting("LastModDateForVCF");
+  ASSERT_TRUE(saved && saved->asDate());
+  platform::CalendarDate shifted = *saved->asDate();
+  shifted.setTimeZone(*platform::TimeZone::named("Asia/Kolkata"));
+  client()->setSetting("LastModDateForVCF", platform::Value(shifted));
+  EXPECT_TRUE(sync().logged("Nothing to push for contacts..."));
+  EXPECT_FALSE(rewritten());
+}
+
 TEST_F(PushDecision, AMissingFileIsPushed) {
   settle();
   std::filesystem::remove(vcfPath());
@@ -168,6 +181,17 @@ TEST_F(PushDecision, AFailedWriteCommitsNothingAndTheNextRunPushesAgain) {
   EXPECT_EQ(next.lastStatus, 0);
   EXPECT_TRUE(next.logged("List of contacts to push has changed"));
   EXPECT_EQ(client()->mirrorSize(), 2u);
+}
+
+TEST_F(PushDecision, AWriteWithoutCardsNeverAsksThePlayerAboutPhotos) {
+  // A change (a group) but no contact: no card asks for a photo, and the failed write stores
+  // no photo setting, so nothing needs the player's capabilities.
+  put(R"({"id": "friends", "record": {"tessel.record.entity": "tessel.contacts.Group", "name": "Friends"}})");
+  std::filesystem::create_directories(vcfPath() / "in the way");
+  const SyncOutcome failed = sync(PlayerPhotos::Accepted);
+  EXPECT_EQ(failed.lastStatus, -8865);
+  for (const std::string& line : failed.log)
+    EXPECT_EQ(line.rfind("Sync Contact Images", 0), std::string::npos) << line;
 }
 
 // Another process cancels the session just before the contacts step starts, or while the
