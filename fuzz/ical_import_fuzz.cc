@@ -6,18 +6,18 @@
 #include <set>
 #include <string>
 
-#include "tessel/ical_calendar_reader.h"
-#include "tessel/import_error.h"
+#include "importers/ical_calendar_reader.h"
+#include "importers/import_error.h"
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
-  tessel::ICalCalendarSource source;
+  tessel::importers::ICalCalendarSource source;
   source.identifier = "fuzz";
   source.files.push_back({"fuzz.ics", std::string(reinterpret_cast<const char*>(data), size)});
   source.fallbackTitle = "Fuzz";
-  tessel::ICalCalendar calendar;
+  tessel::importers::ICalCalendar calendar;
   try {
-    calendar = tessel::readICalCalendar(source);
-  } catch (const tessel::ImportError& e) {
+    calendar = tessel::importers::readICalCalendar(source);
+  } catch (const tessel::importers::ImportError& e) {
     // Every fault inside a file names its line.
     if (!e.line()) __builtin_trap();
     return 0;

@@ -5,15 +5,15 @@
 #include <cstdint>
 #include <string_view>
 
-#include "tessel/import_error.h"
-#include "tessel/vcard_import.h"
+#include "importers/import_error.h"
+#include "importers/vcard_import.h"
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   const std::string_view text(reinterpret_cast<const char*>(data), size);
-  tessel::VCardImport import;
+  tessel::importers::VCardImport import;
   try {
     import.addText(text, "fuzz.vcf");
-  } catch (const tessel::ImportError&) {
+  } catch (const tessel::importers::ImportError&) {
     return 0;
   }
   // Converted cards always make records that name their entity, with unique identifiers.

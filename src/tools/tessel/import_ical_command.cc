@@ -16,11 +16,12 @@ std::string counted(std::size_t count, std::string_view one, std::string_view ma
 }  // namespace
 
 void importICalendars(CommandContext& context, const std::vector<std::string>& paths,
-                      const std::optional<std::string>& title, SyncDeletes syncDeletes) {
-  const std::vector<ICalCalendar> calendars =
-      readICalendarPaths(std::vector<std::filesystem::path>(paths.begin(), paths.end()), title);
-  const ICalImportCounts counts = writeICalCalendars(context.store(), calendars, syncDeletes);
-  for (const ICalCalendar& calendar : calendars) {
+                      const std::optional<std::string>& title, importers::SyncDeletes syncDeletes) {
+  const std::vector<importers::ICalCalendar> calendars = importers::readICalendarPaths(
+      std::vector<std::filesystem::path>(paths.begin(), paths.end()), title);
+  const importers::ICalImportCounts counts =
+      importers::writeICalCalendars(context.store(), calendars, syncDeletes);
+  for (const importers::ICalCalendar& calendar : calendars) {
     context.out() << calendar.identifier << " \"" << calendar.title
                   << "\": " << counted(calendar.eventCount, "event", "events") << ", "
                   << counted(calendar.taskCount, "task", "tasks") << '\n';

@@ -4,7 +4,7 @@
 #include <string>
 #include <vector>
 
-#include "tessel/ical_import.h"
+#include "importers/ical_import.h"
 #include "tools/tessel/command_context.h"
 
 namespace tessel::cli {
@@ -14,6 +14,6 @@ namespace tessel::cli {
 // its file and line) imports nothing. Prints one line per calendar,
 // "<id> \"<title>\": N events, M tasks", then "X written, Y deleted".
 void importICalendars(CommandContext& context, const std::vector<std::string>& paths,
-                      const std::optional<std::string>& title, SyncDeletes syncDeletes);
+                      const std::optional<std::string>& title, importers::SyncDeletes syncDeletes);
 
 }  // namespace tessel::cli

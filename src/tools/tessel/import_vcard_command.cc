@@ -16,10 +16,10 @@ std::string counted(std::size_t count, std::string_view one, std::string_view ma
 }  // namespace
 
 void importVCards(CommandContext& context, const std::vector<std::string>& paths,
-                  SyncDeletes syncDeletes) {
-  VCardImport import;
+                  importers::SyncDeletes syncDeletes) {
+  importers::VCardImport import;
   import.addPaths(std::vector<std::filesystem::path>(paths.begin(), paths.end()));
-  const VCardImportSummary summary = import.writeTo(context.store(), syncDeletes);
+  const importers::VCardImportSummary summary = import.writeTo(context.store(), syncDeletes);
   context.out() << counted(summary.contacts, "contact", "contacts") << ", "
                 << counted(summary.groups, "group", "groups") << " from "
                 << counted(summary.files, "file", "files") << "; " << summary.written

@@ -3,7 +3,7 @@
 #include <string>
 #include <vector>
 
-#include "tessel/vcard_import.h"
+#include "importers/vcard_import.h"
 #include "tools/tessel/command_context.h"
 
 namespace tessel::cli {
@@ -12,6 +12,6 @@ namespace tessel::cli {
 // before the store is opened, so that a malformed card anywhere (reported with its file and
 // line) imports nothing. Prints "N contacts, M groups from K files; X written, Y deleted".
 void importVCards(CommandContext& context, const std::vector<std::string>& paths,
-                  SyncDeletes syncDeletes);
+                  importers::SyncDeletes syncDeletes);
 
 }  // namespace tessel::cli

@@ -101,7 +101,8 @@ int main(int argc, char** argv) {
   vcard->callback([&] {
     command = [&](CommandContext& context) {
       importVCards(context, vcardPaths,
-                   vcardSyncDeletes ? tessel::SyncDeletes::On : tessel::SyncDeletes::Off);
+                   vcardSyncDeletes ? tessel::importers::SyncDeletes::On
+                                    : tessel::importers::SyncDeletes::Off);
     };
   });
 
@@ -120,7 +121,8 @@ int main(int argc, char** argv) {
   ical->callback([&] {
     command = [&](CommandContext& context) {
       importICalendars(context, icalPaths, icalTitle,
-                       icalSyncDeletes ? tessel::SyncDeletes::On : tessel::SyncDeletes::Off);
+                       icalSyncDeletes ? tessel::importers::SyncDeletes::On
+                                       : tessel::importers::SyncDeletes::Off);
     };
   });
 

@@ -1,5 +1,5 @@
 // `tessel import ical` through the built binary, as users run it, on the calendar exports of
-// tests/tessel/data/ical/ and on files each test writes into a fresh folder.
+// tests/importers/data/ical/ and on files each test writes into a fresh folder.
 
 #include <string>
 #include <vector>
@@ -10,7 +10,7 @@ namespace {
 
 using namespace tessel::testing;
 
-const fs::path kData = fs::path(ZT_TEST_DATA_DIR) / ".." / ".." / "tessel" / "data" / "ical";
+const fs::path kData = fs::path(ZT_TEST_DATA_DIR) / ".." / ".." / "importers" / "data" / "ical";
 
 std::size_t lineCount(const std::string& text) {
   std::size_t lines = 0;

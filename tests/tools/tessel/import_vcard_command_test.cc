@@ -9,7 +9,7 @@ namespace {
 
 using namespace tessel::testing;
 
-const fs::path kData = fs::path(ZT_TEST_DATA_DIR) / ".." / ".." / "tessel" / "data" / "vcard";
+const fs::path kData = fs::path(ZT_TEST_DATA_DIR) / ".." / ".." / "importers" / "data" / "vcard";
 
 class ImportVCardCommand : public TesselCommandTest {
  protected:

@@ -9,7 +9,7 @@
 
 struct icalcomponent_impl;
 
-namespace tessel {
+namespace tessel::importers {
 
 // The zones that the TZID parameters of one VCALENDAR object name (RFC 5545 section 3.2.19:
 // a TZID refers to a VTIMEZONE of the same object). A TZID becomes, in this order:
@@ -38,4 +38,4 @@ class ICalTimeZones {
 // the two yearly rules as a POSIX rule ("M3.5.0,M10.5.0/3"). None when it has no observance.
 std::optional<zt::platform::TimeZone> unnamedZoneOfVTimezone(icalcomponent_impl* vtimezone);
 
-}  // namespace tessel
+}  // namespace tessel::importers

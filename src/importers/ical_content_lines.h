@@ -5,7 +5,7 @@
 #include <string_view>
 #include <vector>
 
-namespace tessel {
+namespace tessel::importers {
 
 // One content line of an iCalendar file after unfolding, with the 1-based line of the file on
 // which it starts, so that every later message can point at the line the user sees.
@@ -28,4 +28,4 @@ struct ICalContentLine {
 // `source` and the line of the first fault.
 std::vector<ICalContentLine> readICalContentLines(std::string_view text, const std::string& source);
 
-}  // namespace tessel
+}  // namespace tessel::importers

@@ -1,4 +1,4 @@
-#include "tessel/vcard_decoding.h"
+#include "importers/vcard_decoding.h"
 
 #include <iconv.h>
 
@@ -6,7 +6,7 @@
 #include <cstdint>
 #include <stdexcept>
 
-namespace tessel::vcard {
+namespace tessel::importers {
 
 namespace {
 
@@ -257,4 +257,4 @@ std::string_view trimBlanks(std::string_view text) {
   return text;
 }
 
-}  // namespace tessel::vcard
+}  // namespace tessel::importers

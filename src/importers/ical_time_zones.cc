@@ -1,4 +1,4 @@
-#include "tessel/ical_time_zones.h"
+#include "importers/ical_time_zones.h"
 
 #include <libical/ical.h>
 
@@ -7,9 +7,9 @@
 #include <tuple>
 #include <vector>
 
-#include "tessel/ical_windows_zone.h"
+#include "importers/ical_windows_zone.h"
 
-namespace tessel {
+namespace tessel::importers {
 
 namespace {
 
@@ -190,4 +190,4 @@ std::optional<TimeZone> ICalTimeZones::resolve(std::string_view tzid) const {
   return std::nullopt;
 }
 
-}  // namespace tessel
+}  // namespace tessel::importers

@@ -4,7 +4,7 @@
 #include <string_view>
 #include <vector>
 
-namespace tessel {
+namespace tessel::importers {
 
 // One line of an imported text file as it stands, before unfolding, with its 1-based number
 // for error messages.
@@ -18,4 +18,4 @@ struct PhysicalLine {
 // end a line here, so that no CR is left inside a line.
 std::vector<PhysicalLine> physicalLines(std::string_view text);
 
-}  // namespace tessel
+}  // namespace tessel::importers

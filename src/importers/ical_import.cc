@@ -1,4 +1,4 @@
-#include "tessel/ical_import.h"
+#include "importers/ical_import.h"
 
 #include <algorithm>
 #include <cerrno>
@@ -13,7 +13,7 @@
 #include "platform/value.h"
 #include "tessel/schema.h"
 
-namespace tessel {
+namespace tessel::importers {
 
 namespace fs = std::filesystem;
 
@@ -32,7 +32,8 @@ std::string lowerCased(std::string text) {
 
 std::string readText(const fs::path& path, const std::string& name) {
   std::ifstream in(path, std::ios::binary);
-  if (!in) throw ImportError(name, std::nullopt, std::string("cannot read: ") + std::strerror(errno));
+  if (!in)
+    throw ImportError(name, std::nullopt, std::string("cannot read: ") + std::strerror(errno));
   std::ostringstream text;
   text << in.rdbuf();
   if (in.bad()) throw ImportError(name, std::nullopt, "cannot read");
@@ -238,4 +239,4 @@ ICalImportCounts writeICalCalendars(Store& store, const std::vector<ICalCalendar
   return counts;
 }
 
-}  // namespace tessel
+}  // namespace tessel::importers

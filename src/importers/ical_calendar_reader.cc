@@ -1,4 +1,4 @@
-#include "tessel/ical_calendar_reader.h"
+#include "importers/ical_calendar_reader.h"
 
 #include <libical/ical.h>
 
@@ -9,14 +9,14 @@
 #include <memory>
 #include <utility>
 
+#include "importers/ical_document.h"
+#include "importers/ical_time_zones.h"
+#include "importers/import_error.h"
 #include "platform/calendar_date.h"
 #include "platform/value.h"
-#include "tessel/ical_document.h"
-#include "tessel/import_error.h"
-#include "tessel/ical_time_zones.h"
 #include "tessel/schema.h"
 
-namespace tessel {
+namespace tessel::importers {
 
 namespace {
 
@@ -801,4 +801,4 @@ ICalCalendar readICalCalendar(const ICalCalendarSource& source) {
   return CalendarBuilder(source).build();
 }
 
-}  // namespace tessel
+}  // namespace tessel::importers

@@ -12,7 +12,7 @@
 
 #include "platform/value.h"
 
-namespace tessel::vcard {
+namespace tessel::importers {
 
 // RFC 4648 base64 with the line breaks and blanks that folded vCard lines leave inside it.
 // Padding may be left out; anything else outside the alphabet is an error.
@@ -43,4 +43,4 @@ std::string lowerAscii(std::string_view text);
 // Without blanks (space, tab) at either end.
 std::string_view trimBlanks(std::string_view text);
 
-}  // namespace tessel::vcard
+}  // namespace tessel::importers

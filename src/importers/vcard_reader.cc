@@ -1,14 +1,14 @@
-#include "tessel/vcard_reader.h"
+#include "importers/vcard_reader.h"
 
 #include <algorithm>
 #include <optional>
 #include <stdexcept>
 
-#include "tessel/import_error.h"
-#include "tessel/physical_lines.h"
-#include "tessel/vcard_decoding.h"
+#include "importers/import_error.h"
+#include "importers/physical_lines.h"
+#include "importers/vcard_decoding.h"
 
-namespace tessel::vcard {
+namespace tessel::importers {
 
 namespace {
 
@@ -218,4 +218,4 @@ std::vector<Card> readCards(std::string_view input, const std::string& source) {
   return cards;
 }
 
-}  // namespace tessel::vcard
+}  // namespace tessel::importers

@@ -6,7 +6,7 @@
 
 #include "tessel/record.h"
 
-namespace tessel {
+namespace tessel::importers {
 
 // The text of one iCalendar file, under the name messages give it (the path as the user
 // wrote it).
@@ -45,4 +45,4 @@ struct ICalCalendar {
 // does not exist, a TZID that nothing defines.
 ICalCalendar readICalCalendar(const ICalCalendarSource& source);
 
-}  // namespace tessel
+}  // namespace tessel::importers

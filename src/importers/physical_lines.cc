@@ -1,6 +1,6 @@
-#include "tessel/physical_lines.h"
+#include "importers/physical_lines.h"
 
-namespace tessel {
+namespace tessel::importers {
 
 std::vector<PhysicalLine> physicalLines(std::string_view text) {
   std::vector<PhysicalLine> lines;
@@ -16,4 +16,4 @@ std::vector<PhysicalLine> physicalLines(std::string_view text) {
   return lines;
 }
 
-}  // namespace tessel
+}  // namespace tessel::importers

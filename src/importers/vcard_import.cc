@@ -1,4 +1,4 @@
-#include "tessel/vcard_import.h"
+#include "importers/vcard_import.h"
 
 #include <algorithm>
 #include <cerrno>
@@ -10,13 +10,13 @@
 #include <unordered_set>
 #include <utility>
 
+#include "importers/import_error.h"
+#include "importers/vcard_decoding.h"
+#include "importers/vcard_identifiers.h"
+#include "importers/vcard_reader.h"
 #include "tessel/schema.h"
-#include "tessel/vcard_decoding.h"
-#include "tessel/import_error.h"
-#include "tessel/vcard_identifiers.h"
-#include "tessel/vcard_reader.h"
 
-namespace tessel {
+namespace tessel::importers {
 
 namespace {
 
@@ -34,7 +34,7 @@ std::string readFile(const fs::path& file) {
   std::ifstream in(file, std::ios::binary);
   if (!in) {
     throw ImportError(file.string(), std::nullopt,
-                     std::string("cannot read: ") + std::strerror(errno));
+                      std::string("cannot read: ") + std::strerror(errno));
   }
   std::ostringstream text;
   text << in.rdbuf();
@@ -70,8 +70,7 @@ void VCardImport::addPaths(const std::vector<fs::path>& paths) {
     fs::directory_iterator entries(path, error);
     for (; !error && entries != fs::directory_iterator(); entries.increment(error)) {
       const fs::path& file = entries->path();
-      if (vcard::lowerAscii(file.extension().string()) == ".vcf" &&
-          entries->is_regular_file(error)) {
+      if (lowerAscii(file.extension().string()) == ".vcf" && entries->is_regular_file(error)) {
         files.push_back(file);
       }
     }
@@ -87,12 +86,12 @@ void VCardImport::addFile(const fs::path& file) {
 
 void VCardImport::addText(std::string_view text, const std::string& source) {
   // The whole file is converted before anything is kept, so a fault leaves no part of it.
-  std::vector<vcard::ConvertedCard> converted;
-  for (const vcard::Card& card : vcard::readCards(text, source)) {
-    converted.push_back(vcard::convertCard(card, source));
+  std::vector<ConvertedCard> converted;
+  for (const Card& card : readCards(text, source)) {
+    converted.push_back(convertCard(card, source));
   }
-  for (vcard::ConvertedCard& card : converted) {
-    if (card.kind == vcard::CardKind::Group) {
+  for (ConvertedCard& card : converted) {
+    if (card.kind == CardKind::Group) {
       if (!card.groupNames.empty()) groupCards_.push_back(std::move(card));
       continue;
     }
@@ -109,22 +108,22 @@ void VCardImport::addText(std::string_view text, const std::string& source) {
 VCardImport::Groups VCardImport::groups() const {
   Groups groups;
   auto addMember = [&](const std::string& name, const std::string& contact) {
-    auto& [groupName, members] = groups.byIdentifier[vcard::groupIdentifier(name)];
+    auto& [groupName, members] = groups.byIdentifier[groupIdentifier(name)];
     groupName = name;
     if (!contact.empty() && std::find(members.begin(), members.end(), contact) == members.end()) {
       members.push_back(contact);
     }
   };
   std::map<std::string, std::string, std::less<>> contactOfUid;
-  for (const vcard::ConvertedCard& contact : contacts_) {
+  for (const ConvertedCard& contact : contacts_) {
     for (const std::string& name : contact.groupNames) addMember(name, contact.identifier);
     if (!contact.uid.empty()) {
       std::string uid = contact.uid;
-      if (vcard::lowerAscii(uid).starts_with("urn:uuid:")) uid.erase(0, 9);
+      if (lowerAscii(uid).starts_with("urn:uuid:")) uid.erase(0, 9);
       contactOfUid.emplace(uid, contact.identifier);
     }
   }
-  for (const vcard::ConvertedCard& group : groupCards_) {
+  for (const ConvertedCard& group : groupCards_) {
     addMember(group.groupNames.front(), "");
     for (const std::string& uid : group.memberUids) {
       if (auto contact = contactOfUid.find(uid); contact != contactOfUid.end()) {
@@ -150,7 +149,7 @@ std::vector<Record> VCardImport::records() const {
   }
 
   std::vector<Record> records;
-  for (const vcard::ConvertedCard& contact : contacts_) {
+  for (const ConvertedCard& contact : contacts_) {
     Dictionary record = contact.attributes;
     if (auto groupsOfContact = parents.find(contact.identifier); groupsOfContact != parents.end()) {
       record.set(TesselRelationship_Contacts_Contact_ParentGroups,
@@ -165,13 +164,13 @@ std::vector<Record> VCardImport::records() const {
     };
     for (std::string_view relationship : kRelationships) {
       std::vector<std::string> identifiers;
-      for (const vcard::RelatedRecord& related : contact.related) {
+      for (const RelatedRecord& related : contact.related) {
         if (related.relationship == relationship) identifiers.push_back(related.record.id);
       }
       if (!identifiers.empty()) record.set(relationship, identifierArray(identifiers));
     }
     records.push_back(Record{contact.identifier, std::move(record)});
-    for (const vcard::RelatedRecord& related : contact.related) records.push_back(related.record);
+    for (const RelatedRecord& related : contact.related) records.push_back(related.record);
   }
   for (const auto& [identifier, group] : allGroups.byIdentifier) {
     records.push_back(Record{
@@ -188,24 +187,24 @@ VCardImportSummary VCardImport::writeTo(Store& store, SyncDeletes syncDeletes) c
   std::unordered_set<std::string> produced;
   for (const Record& record : records) produced.insert(record.id);
   std::set<std::string, std::less<>> importedContacts;
-  for (const vcard::ConvertedCard& contact : contacts_) importedContacts.insert(contact.identifier);
+  for (const ConvertedCard& contact : contacts_) importedContacts.insert(contact.identifier);
 
   // What earlier imports left: their identifiers, and their groups' members.
   std::vector<std::string> deletions;
   std::map<std::string, std::vector<std::string>> earlierMembers;
   store.forEachRecord([&](const Record& record) {
-    if (!vcard::isImportedIdentifier(record.id) || produced.contains(record.id)) {
-      if (record.id.starts_with(vcard::kGroupPrefix)) {
+    if (!isImportedIdentifier(record.id) || produced.contains(record.id)) {
+      if (record.id.starts_with(kGroupPrefix)) {
         earlierMembers[record.id] =
             stringsOf(record.record.find(TesselRelationship_Contacts_Group_Members));
       }
       return;
     }
-    const std::string_view owner = vcard::owningContactIdentifier(record.id);
+    const std::string_view owner = owningContactIdentifier(record.id);
     // The related records a re-imported contact no longer has are its own garbage.
     if (syncDeletes == SyncDeletes::On || (!owner.empty() && importedContacts.contains(owner))) {
       deletions.push_back(record.id);
-    } else if (record.id.starts_with(vcard::kGroupPrefix)) {
+    } else if (record.id.starts_with(kGroupPrefix)) {
       earlierMembers[record.id] =
           stringsOf(record.record.find(TesselRelationship_Contacts_Group_Members));
     }
@@ -215,7 +214,7 @@ VCardImportSummary VCardImport::writeTo(Store& store, SyncDeletes syncDeletes) c
     // A group keeps the contacts of earlier imports that this one did not read again.
     std::map<std::string, std::size_t> groupRecords;
     for (std::size_t i = 0; i < records.size(); ++i) {
-      if (records[i].id.starts_with(vcard::kGroupPrefix)) groupRecords[records[i].id] = i;
+      if (records[i].id.starts_with(kGroupPrefix)) groupRecords[records[i].id] = i;
     }
     for (const auto& [identifier, members] : earlierMembers) {
       std::vector<std::string> kept;
@@ -254,4 +253,4 @@ VCardImportSummary VCardImport::writeTo(Store& store, SyncDeletes syncDeletes) c
   return summary;
 }
 
-}  // namespace tessel
+}  // namespace tessel::importers

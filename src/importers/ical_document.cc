@@ -1,4 +1,4 @@
-#include "tessel/ical_document.h"
+#include "importers/ical_document.h"
 
 #include <libical/ical.h>
 
@@ -6,9 +6,9 @@
 #include <cstdlib>
 #include <memory>
 
-#include "tessel/ical_content_lines.h"
+#include "importers/ical_content_lines.h"
 
-namespace tessel {
+namespace tessel::importers {
 
 namespace {
 
@@ -195,10 +195,10 @@ std::optional<std::size_t> ICalDocument::lineOf(icalcomponent* component) {
 }
 
 ImportError ICalDocument::errorAt(icalproperty* property, icalcomponent* component,
-                                std::string reason) const {
+                                  std::string reason) const {
   std::optional<std::size_t> line = lineOf(property);
   if (!line) line = lineOf(component);
   return ImportError(source_, line, std::move(reason));
 }
 
-}  // namespace tessel
+}  // namespace tessel::importers

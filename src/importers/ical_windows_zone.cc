@@ -1,10 +1,10 @@
-#include "tessel/ical_windows_zone.h"
+#include "importers/ical_windows_zone.h"
 
 #include <unicode/ucal.h>
 
 #include <vector>
 
-namespace tessel {
+namespace tessel::importers {
 
 std::optional<std::string> ianaZoneForWindowsZone(std::string_view windowsName) {
   // Windows zone names are short printable ASCII texts; anything else is no Windows name.
@@ -32,4 +32,4 @@ std::optional<std::string> ianaZoneForWindowsZone(std::string_view windowsName) 
   return iana;
 }
 
-}  // namespace tessel
+}  // namespace tessel::importers

@@ -1,16 +1,16 @@
-#include "tessel/vcard_contact.h"
+#include "importers/vcard_contact.h"
 
 #include <algorithm>
 #include <optional>
 #include <stdexcept>
 #include <utility>
 
+#include "importers/import_error.h"
+#include "importers/vcard_decoding.h"
+#include "importers/vcard_identifiers.h"
 #include "tessel/schema.h"
-#include "tessel/vcard_decoding.h"
-#include "tessel/import_error.h"
-#include "tessel/vcard_identifiers.h"
 
-namespace tessel::vcard {
+namespace tessel::importers {
 
 namespace {
 
@@ -515,4 +515,4 @@ ConvertedCard convertCard(const Card& card, const std::string& source) {
   return Converter(card, source).convert();
 }
 
-}  // namespace tessel::vcard
+}  // namespace tessel::importers

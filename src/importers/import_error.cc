@@ -1,8 +1,8 @@
-#include "tessel/import_error.h"
+#include "importers/import_error.h"
 
 #include <utility>
 
-namespace tessel {
+namespace tessel::importers {
 
 namespace {
 
@@ -21,4 +21,4 @@ ImportError::ImportError(std::string source, std::optional<std::size_t> line, st
       line_(line),
       reason_(std::move(reason)) {}
 
-}  // namespace tessel
+}  // namespace tessel::importers

@@ -5,7 +5,7 @@
 #include <stdexcept>
 #include <string>
 
-namespace tessel {
+namespace tessel::importers {
 
 // What is wrong with an imported file, and where: the file (or the name the text was given)
 // and the 1-based line on which the faulty property, card or component starts. Its text reads
@@ -26,4 +26,4 @@ class ImportError : public std::runtime_error {
   std::string reason_;
 };
 
-}  // namespace tessel
+}  // namespace tessel::importers

@@ -7,7 +7,7 @@
 #include <string>
 #include <string_view>
 
-namespace tessel::vcard {
+namespace tessel::importers {
 
 // "vcard/uid:<UID>" for a card with a UID; "vcard/hash:<16 hex digits>" of the card's name
 // fields, first e-mail and first phone otherwise. "/" and "%" in a UID are %-escaped, so the
@@ -27,4 +27,4 @@ bool isImportedIdentifier(std::string_view identifier);
 // empty for a group or any other record.
 std::string_view owningContactIdentifier(std::string_view identifier);
 
-}  // namespace tessel::vcard
+}  // namespace tessel::importers

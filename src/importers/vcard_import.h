@@ -7,12 +7,12 @@
 #include <string_view>
 #include <vector>
 
-#include "tessel/import_options.h"
+#include "importers/import_options.h"
+#include "importers/vcard_contact.h"
 #include "tessel/record.h"
 #include "tessel/store.h"
-#include "tessel/vcard_contact.h"
 
-namespace tessel {
+namespace tessel::importers {
 
 struct VCardImportSummary {
   std::size_t contacts = 0;
@@ -65,10 +65,10 @@ class VCardImport {
   };
   Groups groups() const;
 
-  std::vector<vcard::ConvertedCard> contacts_;
+  std::vector<ConvertedCard> contacts_;
   std::map<std::string, std::size_t, std::less<>> contactIndex_;
-  std::vector<vcard::ConvertedCard> groupCards_;
+  std::vector<ConvertedCard> groupCards_;
   std::size_t files_ = 0;
 };
 
-}  // namespace tessel
+}  // namespace tessel::importers

@@ -6,13 +6,13 @@
 #include <string>
 #include <vector>
 
-#include "tessel/ical_calendar_reader.h"
-#include "tessel/import_error.h"
+#include "importers/ical_calendar_reader.h"
+#include "importers/import_error.h"
 #include "tessel/store.h"
 // SyncDeletes, which both importers take, is declared with the vCard importer.
-#include "tessel/import_options.h"
+#include "importers/import_options.h"
 
-namespace tessel {
+namespace tessel::importers {
 
 // `tessel import ical`: iCalendar files and vdir folders into the calendars schema. Each
 // path becomes one calendar: a file, or every *.ics file of a folder. Reading and writing
@@ -43,4 +43,4 @@ struct ICalImportCounts {
 ICalImportCounts writeICalCalendars(Store& store, const std::vector<ICalCalendar>& calendars,
                                     SyncDeletes syncDeletes);
 
-}  // namespace tessel
+}  // namespace tessel::importers

@@ -1,9 +1,9 @@
-#include "tessel/vcard_identifiers.h"
+#include "importers/vcard_identifiers.h"
 
 #include <cstdint>
 #include <cstdio>
 
-namespace tessel::vcard {
+namespace tessel::importers {
 
 namespace {
 
@@ -57,4 +57,4 @@ std::string_view owningContactIdentifier(std::string_view identifier) {
   return identifier.substr(0, identifier.find('/', kContactPrefix.size()));
 }
 
-}  // namespace tessel::vcard
+}  // namespace tessel::importers

@@ -1,7 +1,7 @@
-// The vCard import on files shaped like real exports (tests/tessel/data/vcard/): what each
+// The vCard import on files shaped like real exports (tests/importers/data/vcard/): what each
 // version's encodings become in records, refusal of malformed input, and re-imports.
 
-#include "tessel/vcard_import.h"
+#include "importers/vcard_import.h"
 
 #include <gtest/gtest.h>
 
@@ -12,12 +12,12 @@
 #include <string>
 #include <vector>
 
+#include "importers/import_error.h"
 #include "platform/base64.h"
-#include "tessel/import_error.h"
 #include "tessel/schema.h"
 #include "tessel/test_store.h"
 
-namespace tessel {
+namespace tessel::importers {
 namespace {
 
 using zt::platform::Array;
@@ -488,4 +488,4 @@ TEST_F(VCardImportStore, AMalformedFileStopsTheImportBeforeAnyWrite) {
 }
 
 }  // namespace
-}  // namespace tessel
+}  // namespace tessel::importers

@@ -2,7 +2,7 @@
 // Thunderbird and vdirsyncer read into records, written into a store, and malformed files
 // refused with their file and line.
 
-#include "tessel/ical_import.h"
+#include "importers/ical_import.h"
 
 #include <gtest/gtest.h>
 
@@ -11,12 +11,12 @@
 #include <string>
 #include <vector>
 
-#include "tessel/ical_windows_zone.h"
+#include "importers/ical_windows_zone.h"
 #include "tessel/record_json.h"
 #include "tessel/schema.h"
 #include "tessel/test_store.h"
 
-namespace tessel {
+namespace tessel::importers {
 namespace {
 
 namespace fs = std::filesystem;
@@ -413,4 +413,4 @@ TEST_F(ICalImportStore, AFaultInAnyFileReadsNothing) {
 }
 
 }  // namespace
-}  // namespace tessel
+}  // namespace tessel::importers

@@ -7,13 +7,13 @@
 #include <utility>
 #include <vector>
 
-#include "tessel/import_error.h"
+#include "importers/import_error.h"
 
 // libical's types, declared here so that only the importer's sources include libical.
 struct icalcomponent_impl;
 struct icalproperty_impl;
 
-namespace tessel {
+namespace tessel::importers {
 
 // One iCalendar file parsed by libical, after every content line was checked on its own so
 // that a fault is reported with its line. Each property and component remembers the line it
@@ -40,7 +40,7 @@ class ICalDocument {
   // An ImportError about this file at the line of `property` (or of `component` when the
   // property is null).
   ImportError errorAt(icalproperty_impl* property, icalcomponent_impl* component,
-                    std::string reason) const;
+                      std::string reason) const;
 
  private:
   ICalDocument(icalcomponent_impl* root, std::string source)
@@ -50,4 +50,4 @@ class ICalDocument {
   std::string source_;
 };
 
-}  // namespace tessel
+}  // namespace tessel::importers

@@ -8,7 +8,7 @@
 #include <string_view>
 #include <vector>
 
-namespace tessel::vcard {
+namespace tessel::importers {
 
 struct Parameter {
   std::string name;                 // upper case: "TYPE", "ENCODING", "CHARSET"
@@ -43,4 +43,4 @@ struct Card {
 // without a colon, a property outside a card, a card without END:VCARD.
 std::vector<Card> readCards(std::string_view text, const std::string& source);
 
-}  // namespace tessel::vcard
+}  // namespace tessel::importers

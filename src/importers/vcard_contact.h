@@ -7,11 +7,11 @@
 #include <string_view>
 #include <vector>
 
+#include "importers/vcard_reader.h"
 #include "platform/value.h"
 #include "tessel/record.h"
-#include "tessel/vcard_reader.h"
 
-namespace tessel::vcard {
+namespace tessel::importers {
 
 enum class CardKind { Contact, Group };
 
@@ -43,4 +43,4 @@ struct ConvertedCard {
 // A group card without a name converts to a group without names, which the import skips.
 ConvertedCard convertCard(const Card& card, const std::string& source);
 
-}  // namespace tessel::vcard
+}  // namespace tessel::importers

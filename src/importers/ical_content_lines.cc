@@ -1,12 +1,12 @@
-#include "tessel/ical_content_lines.h"
+#include "importers/ical_content_lines.h"
 
 #include <optional>
 #include <utility>
 
-#include "tessel/import_error.h"
-#include "tessel/physical_lines.h"
+#include "importers/import_error.h"
+#include "importers/physical_lines.h"
 
-namespace tessel {
+namespace tessel::importers {
 
 namespace {
 
@@ -180,4 +180,4 @@ std::vector<ICalContentLine> readICalContentLines(std::string_view text,
   return lines;
 }
 
-}  // namespace tessel
+}  // namespace tessel::importers
