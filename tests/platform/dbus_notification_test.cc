@@ -10,7 +10,7 @@
 #include <string>
 
 #include "platform/linux/dbus_notification_center.h"
-#include "platform/linux/notification_listener.h"
+#include "platform/notification_listener.h"
 #include "platform/scoped_environment.h"
 #include "platform/temporary_folder.h"
 

@@ -7,7 +7,7 @@
 #include <string>
 #include <vector>
 
-#include "platform/linux/notification_listener.h"
+#include "platform/notification_listener.h"
 #include "platform/value.h"
 #include "sync/synctool_fixture.h"
 

@@ -1,7 +1,5 @@
 #include "tools/tessel/device_commands.h"
 
-#include <unistd.h>
-
 #include <algorithm>
 #include <chrono>
 #include <cmath>
@@ -14,7 +12,8 @@
 #include <vector>
 
 #include "platform/device_library.h"
-#include "platform/linux/notification_listener.h"
+#include "platform/notification_listener.h"
+#include "platform/terminal.h"
 #include "tessel/exception.h"
 
 namespace tessel::cli {
@@ -142,7 +141,7 @@ int watchSyncs(CommandContext& context, const std::optional<std::string>& client
   }
   std::signal(SIGINT, onInterrupt);
   std::signal(SIGTERM, onInterrupt);
-  const bool live = ::isatty(STDOUT_FILENO) == 1;
+  const bool live = zt::platform::isTerminal(zt::platform::StandardStream::Output);
   std::map<std::string, Progress> players;
   std::ostream& out = context.out();
   while (!interrupted) {

@@ -1,4 +1,4 @@
-#include "platform/linux/notification_listener.h"
+#include "platform/linux/dbus_notification_listener.h"
 
 #include <systemd/sd-bus.h>
 
@@ -13,15 +13,20 @@ struct ListenerCallbacks {
   static int onPosted(sd_bus_message* message, void* listener, sd_bus_error*) {
     // A signal of the right name but another shape is somebody else's mistake: skipped.
     if (auto notification = dbus::readNotification(message))
-      static_cast<NotificationListener*>(listener)->received_.push_back(std::move(*notification));
+      static_cast<DBusNotificationListener*>(listener)->received_.push_back(
+          std::move(*notification));
     return 0;
   }
 };
 
 std::unique_ptr<NotificationListener> NotificationListener::connectToSessionBus() {
+  return DBusNotificationListener::connect();
+}
+
+std::unique_ptr<DBusNotificationListener> DBusNotificationListener::connect() {
   sd_bus* bus = nullptr;
   if (sd_bus_open_user(&bus) < 0) return nullptr;
-  std::unique_ptr<NotificationListener> listener(new NotificationListener(bus));
+  std::unique_ptr<DBusNotificationListener> listener(new DBusNotificationListener(bus));
   // The synchronous form waits for the bus to confirm the match.
   if (sd_bus_match_signal(bus, &listener->slot_, nullptr, dbus::kNotificationsPath,
                           dbus::kNotificationsInterface, dbus::kPostedMember,
@@ -30,12 +35,12 @@ std::unique_ptr<NotificationListener> NotificationListener::connectToSessionBus(
   return listener;
 }
 
-NotificationListener::~NotificationListener() {
+DBusNotificationListener::~DBusNotificationListener() {
   sd_bus_slot_unref(slot_);
   sd_bus_flush_close_unref(bus_);
 }
 
-std::optional<Notification> NotificationListener::next(std::chrono::milliseconds timeout) {
+std::optional<Notification> DBusNotificationListener::next(std::chrono::milliseconds timeout) {
   using Clock = std::chrono::steady_clock;
   const auto deadline = Clock::now() + timeout;
   while (received_.empty()) {
@@ -51,10 +56,6 @@ std::optional<Notification> NotificationListener::next(std::chrono::milliseconds
   Notification first = std::move(received_.front());
   received_.pop_front();
   return first;
-}
-
-int NotificationListener::fileDescriptor() const {
-  return sd_bus_get_fd(bus_);
 }
 
 }  // namespace zt::platform
