@@ -24,6 +24,11 @@ bool ZTContactsSyncer::uploadChanges() {
   const std::string fileName(kFileName);
   const std::span<const std::uint8_t> bytes(
       reinterpret_cast<const std::uint8_t*>(_allVCardData.data()), _allVCardData.size());
+  // A run that was killed, or a player pulled, between the write of the temporary file and
+  // its rename left a full-size hidden copy behind. The device lock keeps any other sync from
+  // writing meanwhile, so every such copy is stale; one that cannot be removed is no reason
+  // not to write.
+  if (contacts) (void)contacts->removeStaleTemporaries(fileName);
   // A power loss or a pulled cable leaves the player with the old file or the new one,
   // never half of one. The accepted changes stay uncommitted when the write fails, so the
   // next run offers them again. Without a folder on the player there is nowhere to write.

@@ -50,6 +50,12 @@ std::string uniqueCharacters() {
 
 }  // namespace
 
+bool AtomicFile::isTemporaryName(std::string_view entry, const std::string& name) {
+  const std::string prefix = temporaryPrefix(name);
+  return entry.size() == prefix.size() + kUniqueLength && entry.starts_with(prefix) &&
+         entry.substr(prefix.size()).find_first_not_of(kUniqueCharacters) == std::string::npos;
+}
+
 std::variant<AtomicFile, std::string> AtomicFile::create(const FolderHandle& folder,
                                                          const std::string& name) {
   const std::filesystem::path target = folder.path() / name;

@@ -5,6 +5,7 @@
 #include <optional>
 #include <span>
 #include <string>
+#include <string_view>
 #include <variant>
 
 #include "platform/folder_handle.h"
@@ -25,6 +26,9 @@ class AtomicFile {
   // The file keeps its own descriptor of the folder: the handle may go first.
   static std::variant<AtomicFile, std::string> create(const FolderHandle& folder,
                                                       const std::string& name);
+
+  // Whether `entry` is a name create() may give a temporary file for `name`.
+  static bool isTemporaryName(std::string_view entry, const std::string& name);
 
   AtomicFile(AtomicFile&& other) noexcept;
   AtomicFile& operator=(AtomicFile&& other) noexcept;

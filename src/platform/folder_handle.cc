@@ -176,4 +176,18 @@ std::optional<std::string> FolderHandle::atomicWrite(const std::string& name,
   return file.commit();
 }
 
+std::optional<std::string> FolderHandle::removeStaleTemporaries(const std::string& name) const {
+  auto listing = entries();
+  if (auto* error = std::get_if<std::string>(&listing)) return std::move(*error);
+  for (const std::string& entry : std::get<std::vector<std::string>>(listing)) {
+    if (!AtomicFile::isTemporaryName(entry, name)) continue;
+    auto attributes = readAttributes(fd_, entry);
+    const auto* read = std::get_if<FileAttributes>(&attributes);
+    if (!read || read->type != FileType::Regular) continue;
+    if (::unlinkat(fd_, entry.c_str(), 0) != 0 && errno != ENOENT)
+      return errorText("remove", path_ / entry, errno);
+  }
+  return std::nullopt;
+}
+
 }  // namespace zt::platform

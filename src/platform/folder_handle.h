@@ -61,6 +61,9 @@ class FolderHandle {
   // old file is untouched and no temporary file is left.
   std::optional<std::string> atomicWrite(const std::string& name,
                                          std::span<const std::uint8_t> bytes) const;
+  // Removes the regular files that an interrupted atomicWrite of `name` left behind. Only the
+  // caller can know that no other writer of `name` is at work.
+  std::optional<std::string> removeStaleTemporaries(const std::string& name) const;
 
   // The path the folder was opened by, for messages and logs.
   const std::filesystem::path& path() const { return path_; }

@@ -104,6 +104,7 @@ TEST_F(CalendarsSync, WritesOneFilePerCalendarInTheUsersOrderAndEmptiesTheFolder
   fs::create_directories(calendarsFolder() / "old" / "inner");
   std::ofstream(calendarsFolder() / "stray.ics") << "BEGIN:VCALENDAR\r\n";
   std::ofstream(calendarsFolder() / "old" / "inner" / "notes.txt") << "x";
+  std::ofstream(calendarsFolder() / ".Tessel-Home.ics.tmpAbc123") << "BEGIN:VCALENDAR\r\n";
   // Links go as links: what they lead to is not on the player.
   const fs::path outside = folder() / "outside";
   fs::create_directories(outside);

@@ -132,12 +132,33 @@ TEST_F(AtomicWriteTest, AnAtomicFileThatIsNotCommittedChangesNothing) {
     ASSERT_EQ(file.write(bytesOf("half of the new")), std::nullopt);
     EXPECT_EQ(file.temporaryPath().parent_path(), folder.path());
     const std::string temporary = file.temporaryPath().filename().string();
-    EXPECT_EQ(temporary.rfind(".Tessel.vcf.tmp", 0), 0u) << temporary;
-    EXPECT_EQ(temporary.size(), std::string_view(".Tessel.vcf.tmpXXXXXX").size()) << temporary;
+    EXPECT_TRUE(AtomicFile::isTemporaryName(temporary, "Tessel.vcf")) << temporary;
     EXPECT_TRUE(fs::exists(file.temporaryPath()));
   }
   EXPECT_EQ(contentsOf(folder / "Tessel.vcf"), "old");
   EXPECT_EQ(namesIn(folder.path()), std::vector<std::string>{"Tessel.vcf"});
+}
+
+TEST_F(AtomicWriteTest, OnlyStaleTemporariesOfTheNamedFileAreRemoved) {
+  const fs::path outside = folder / "outside";
+  fs::create_directory(outside);
+  const FolderHandle contacts =
+      std::get<FolderHandle>(handle.openChild("Contacts", IfMissing::Create));
+  const fs::path in = folder / "Contacts";
+  for (const char* name :
+       {".Tessel.vcf.tmpAbc123", ".Tessel.vcf.tmpZZZZZZ", ".Tessel.vcf.tmp", ".Tessel.vcf.tmpAbc12",
+        ".Tessel.vcf.tmpAbc1234", ".Tessel.vcf.tmpAb-123", ".Other.vcf.tmpAbc123", "Tessel.vcf"})
+    writeFile(in / name, "x");
+  fs::create_directory(in / ".Tessel.vcf.tmpDir123");
+  writeFile(outside / "kept", "x");
+  fs::create_directory_symlink(outside, in / ".Tessel.vcf.tmpLnk123");
+
+  ASSERT_EQ(contacts.removeStaleTemporaries("Tessel.vcf"), std::nullopt);
+  EXPECT_EQ(namesIn(in), (std::vector<std::string>{
+                             ".Other.vcf.tmpAbc123", ".Tessel.vcf.tmp", ".Tessel.vcf.tmpAb-123",
+                             ".Tessel.vcf.tmpAbc12", ".Tessel.vcf.tmpAbc1234",
+                             ".Tessel.vcf.tmpDir123", ".Tessel.vcf.tmpLnk123", "Tessel.vcf"}));
+  EXPECT_EQ(namesIn(outside), std::vector<std::string>{"kept"});
 }
 
 class FolderHandleTest : public ::testing::Test {

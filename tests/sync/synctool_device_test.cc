@@ -149,6 +149,25 @@ TEST_F(PlayerVolume, ALinkInPlaceOfAFolderTurnsItsDataClassOffAndLeadsNowhere) {
   }
 }
 
+TEST_F(PlayerVolume, TemporariesLeftByAnInterruptedWriteAreRemovedByTheNextPush) {
+  registerClient(kClientID, true, true);
+  fs::create_directories(volume() / "Contacts");
+  fs::create_directories(volume() / "Calendars");
+  // What a run killed between the write and the rename leaves, and names that only look alike.
+  for (const char* name :
+       {".Tessel.vcf.tmpAbc123", ".Tessel.vcf.tmp", ".Tessel.vcf.tmpAbc1234", "notes.txt"})
+    std::ofstream(volume() / "Contacts" / name) << "BEGIN:VCARD";
+  std::ofstream(volume() / "Calendars" / ".Tessel-Home.ics.tmpXyz789") << "BEGIN:VCALENDAR";
+
+  const SynctoolRun run = syncClient(kClientID);
+
+  EXPECT_EQ(run.finalStatus(), 0) << run.log;
+  EXPECT_EQ(namesIn(volume() / "Contacts"),
+            (std::vector<std::string>{".Tessel.vcf.tmp", ".Tessel.vcf.tmpAbc1234", "Tessel.vcf",
+                                      "notes.txt"}));
+  EXPECT_TRUE(namesIn(volume() / "Calendars").empty());
+}
+
 using PlayerLock = SynctoolTest;
 
 TEST_F(PlayerLock, APlayerLockedByAnotherProcessIsNotSynced) {
