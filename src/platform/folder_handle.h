@@ -67,6 +67,7 @@ class FolderHandle {
 
   // The path the folder was opened by, for messages and logs.
   const std::filesystem::path& path() const { return path_; }
+  // The folder's own descriptor, for the operations of AtomicFile; owned by the handle.
   int descriptor() const { return fd_; }
 
  private:
