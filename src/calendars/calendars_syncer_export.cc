@@ -81,7 +81,8 @@ bool ZTCalendarsSyncer::uploadChangesForCalendarWithID(const std::string& /*cale
   const std::optional<std::string>& folder = _syncManager.pathToZetoCalendarsFolder();
   std::filesystem::path path =
       folder ? std::filesystem::path(*folder) / fileName : std::filesystem::path(fileName);
-  if (!folder || _syncManager.services().files.atomicWrite(path, data)) {
+  const platform::FolderHandle* calendars = _syncManager.zetoCalendarsFolder();
+  if (!calendars || calendars->atomicWrite(fileName, data)) {
     Log::debug("Can't write calendar at path %@", path.string());
     _syncManager.setLastStatus(sync::kStatusWriteFailed);
     return false;

@@ -163,10 +163,9 @@ bool ZTCalendarsSyncer::getChanges() {
 }
 
 bool ZTCalendarsSyncer::cleanCalendarFolder() {
-  const std::optional<std::string>& folder = _syncManager.pathToZetoCalendarsFolder();
-  const platform::FileSystem& files = _syncManager.services().files;
+  const platform::FolderHandle* folder = _syncManager.zetoCalendarsFolder();
   std::variant<std::vector<std::string>, std::string> listing =
-      folder ? files.contentsOfDirectory(*folder)
+      folder ? folder->entries()
              : std::variant<std::vector<std::string>, std::string>(
                    "the player has no calendars folder");
   if (const std::string* failure = std::get_if<std::string>(&listing)) {
@@ -174,9 +173,11 @@ bool ZTCalendarsSyncer::cleanCalendarFolder() {
     _syncManager.setLastStatus(sync::kStatusWriteFailed);
     return false;
   }
+  // Every entry goes, the temporary files of an interrupted write included. A link is removed
+  // as a link: what it leads to is not on the player.
   for (const std::string& name : std::get<std::vector<std::string>>(listing)) {
     Log::debug("Removing %@", name);
-    if (std::optional<std::string> failure = files.remove(std::filesystem::path(*folder) / name)) {
+    if (std::optional<std::string> failure = folder->remove(name)) {
       Log::debug("The calendar '%@' could not be removed. Reason: %@", name, *failure);
     }
   }

@@ -2,6 +2,7 @@
 #include <filesystem>
 #include <optional>
 #include <span>
+#include <string>
 #include <variant>
 
 #include "contacts/zt_contacts_syncer.h"
@@ -19,20 +20,26 @@ bool ZTContactsSyncer::uploadChanges() {
   const std::filesystem::path path = std::filesystem::path(folder.value_or("")) / kFileName;
   Log::debug("Uploading changes to %@ (%ul bytes)", path.string(), _allVCardData.size());
 
-  const platform::FileSystem& files = _syncManager.services().files;
+  const platform::FolderHandle* contacts = _syncManager.zetoContactsFolder();
+  const std::string fileName(kFileName);
   const std::span<const std::uint8_t> bytes(
       reinterpret_cast<const std::uint8_t*>(_allVCardData.data()), _allVCardData.size());
+  // A run that was killed, or a player pulled, between the write of the temporary file and
+  // its rename left a full-size hidden copy behind. The device lock keeps any other sync from
+  // writing meanwhile, so every such copy is stale; one that cannot be removed is no reason
+  // not to write.
+  if (contacts) (void)contacts->removeStaleTemporaries(fileName);
   // A power loss or a pulled cable leaves the player with the old file or the new one,
   // never half of one. The accepted changes stay uncommitted when the write fails, so the
   // next run offers them again. Without a folder on the player there is nowhere to write.
-  if (!folder || files.atomicWrite(path, bytes)) {
+  if (!contacts || contacts->atomicWrite(fileName, bytes)) {
     Log::debug("Unabled to write file on Zeto");
     _syncManager.setLastStatus(sync::kStatusWriteFailed);
     return false;
   }
   Log::debug("Uploading done");
 
-  std::variant<platform::FileAttributes, std::string> attributes = files.attributes(path);
+  std::variant<platform::FileAttributes, std::string> attributes = contacts->attributes(fileName);
   if (const std::string* reason = std::get_if<std::string>(&attributes)) {
     Log::debug("Can't get VCF attributes after push. Reason: %@", *reason);
     _syncManager.setLastStatus(sync::kStatusWriteFailed);

@@ -114,11 +114,11 @@ bool ZTContactsSyncer::fileOnZetoNeedsPush() {
     Log::debug("Force pushing VCF file as we never noted last modification date");
     return true;
   }
-  const std::optional<std::string>& folder = _syncManager.pathToZetoContactsFolder();
   std::optional<platform::CalendarDate> date;
-  if (folder) {
-    date =
-        _syncManager.services().files.modificationDate(std::filesystem::path(*folder) / kFileName);
+  if (const platform::FolderHandle* contacts = _syncManager.zetoContactsFolder()) {
+    auto attributes = contacts->attributes(std::string(kFileName));
+    if (auto* read = std::get_if<platform::FileAttributes>(&attributes))
+      date = std::move(read->modificationDate);
   }
   if (!date) {
     Log::debug("Can't get VCF attributes on Zeto, force pushing VCF");

@@ -1,13 +1,11 @@
 #include "platform/atomic_file.h"
 
 #include <fcntl.h>
-#include <sys/stat.h>
+#include <sys/random.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
-#include <cstdlib>
-#include <fstream>
-#include <string_view>
 #include <utility>
 
 #include "platform/error_text.h"
@@ -17,63 +15,89 @@ namespace {
 
 constexpr std::size_t kMaximumNameLength = 255;
 constexpr std::string_view kTemporarySuffix = ".tmp";
-constexpr std::string_view kUniqueSuffix = "XXXXXX";
+constexpr std::size_t kUniqueLength = 6;
+// The characters mkstemp(3) uses for its XXXXXX.
+constexpr std::string_view kUniqueCharacters =
+    "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789";
+// As glibc's mkstemp: enough that only a full folder or a broken random source exhausts them.
+constexpr int kAttempts = 62 * 62 * 62;
 
-// ".<name>.tmpXXXXXX". A name close to the limit is shortened (at a UTF-8 character
-// boundary) so that every name the target itself may have still gets a temporary file.
-std::string temporaryTemplate(const std::string& name) {
-  const std::size_t room = kMaximumNameLength - 1 - kTemporarySuffix.size() - kUniqueSuffix.size();
+// ".<name>.tmp". A name close to the limit is shortened (at a UTF-8 character boundary) so
+// that every name the target itself may have still gets a temporary file.
+std::string temporaryPrefix(const std::string& name) {
+  const std::size_t room = kMaximumNameLength - 1 - kTemporarySuffix.size() - kUniqueLength;
   std::size_t length = std::min(name.size(), room);
   while (length > 0 && length < name.size() &&
          (static_cast<unsigned char>(name[length]) & 0xC0) == 0x80)
     --length;
-  return "." + name.substr(0, length) + std::string(kTemporarySuffix) + std::string(kUniqueSuffix);
+  return "." + name.substr(0, length) + std::string(kTemporarySuffix);
 }
 
-// The mode a plainly created file would get. umask(2) cannot be read without changing it,
-// which would race with other threads, so it is read from /proc.
-mode_t defaultFileMode() {
-  mode_t mask = 022;
-  std::ifstream status("/proc/self/status");
-  for (std::string line; std::getline(status, line);) {
-    if (line.rfind("Umask:", 0) == 0) {
-      mask = static_cast<mode_t>(std::strtoul(line.c_str() + 6, nullptr, 8));
-      break;
-    }
+std::string uniqueCharacters() {
+  unsigned char random[kUniqueLength] = {};
+  std::size_t filled = 0;
+  while (filled < sizeof random) {
+    const ssize_t got = ::getrandom(random + filled, sizeof random - filled, 0);
+    if (got > 0)
+      filled += static_cast<std::size_t>(got);
+    else if (errno != EINTR)
+      break;  // the bytes left as they are still make a name
   }
-  return static_cast<mode_t>(0666 & ~mask);
-}
-
-std::filesystem::path folderOf(const std::filesystem::path& target) {
-  const std::filesystem::path parent = target.parent_path();
-  return parent.empty() ? std::filesystem::path(".") : parent;
+  std::string text;
+  for (unsigned char byte : random) text += kUniqueCharacters[byte % kUniqueCharacters.size()];
+  return text;
 }
 
 }  // namespace
 
-std::variant<AtomicFile, std::string> AtomicFile::create(const std::filesystem::path& target) {
-  const std::filesystem::path folder = folderOf(target);
-  std::string pattern = (folder / temporaryTemplate(target.filename().string())).string();
-  const int fd = ::mkostemp(pattern.data(), O_CLOEXEC);
-  if (fd < 0) return errorText("create a temporary file for", target, errno);
-  // mkstemp makes the file private (0600); the target gets the usual permissions. File
-  // systems without permissions (FAT on players) refuse, which does not matter.
-  (void)::fchmod(fd, defaultFileMode());
-  return AtomicFile(target, pattern, fd);
+bool AtomicFile::isTemporaryName(std::string_view entry, const std::string& name) {
+  const std::string prefix = temporaryPrefix(name);
+  return entry.size() == prefix.size() + kUniqueLength && entry.starts_with(prefix) &&
+         entry.substr(prefix.size()).find_first_not_of(kUniqueCharacters) == std::string::npos;
 }
 
-AtomicFile::AtomicFile(std::filesystem::path target, std::filesystem::path temporary, int fd)
-    : target_(std::move(target)), temporary_(std::move(temporary)), fd_(fd) {}
+std::variant<AtomicFile, std::string> AtomicFile::create(const FolderHandle& folder,
+                                                         const std::string& name) {
+  const std::filesystem::path target = folder.path() / name;
+  const int folderFd = ::fcntl(folder.descriptor(), F_DUPFD_CLOEXEC, 0);
+  if (folderFd < 0) return errorText("create a temporary file for", target, errno);
+  const std::string prefix = temporaryPrefix(name);
+  int error = EEXIST;
+  for (int attempt = 0; attempt < kAttempts && error == EEXIST; ++attempt) {
+    std::string temporary = prefix + uniqueCharacters();
+    // The umask applies to 0666 as to any new file; file systems without permissions (FAT on
+    // players) ignore it.
+    const int fd = ::openat(folderFd, temporary.c_str(),
+                            O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0666);
+    if (fd >= 0) return AtomicFile(folderFd, folder.path(), name, std::move(temporary), fd);
+    error = errno;
+  }
+  ::close(folderFd);
+  return errorText("create a temporary file for", target, error);
+}
+
+AtomicFile::AtomicFile(int folderFd, std::filesystem::path folderPath, std::string name,
+                       std::string temporary, int fd)
+    : folderFd_(folderFd),
+      folderPath_(std::move(folderPath)),
+      name_(std::move(name)),
+      temporary_(std::move(temporary)),
+      fd_(fd) {}
 
 AtomicFile::AtomicFile(AtomicFile&& other) noexcept
-    : target_(std::move(other.target_)),
+    : folderFd_(std::exchange(other.folderFd_, -1)),
+      folderPath_(std::move(other.folderPath_)),
+      name_(std::move(other.name_)),
       temporary_(std::exchange(other.temporary_, {})),
       fd_(std::exchange(other.fd_, -1)) {}
 
 AtomicFile& AtomicFile::operator=(AtomicFile&& other) noexcept {
   if (this != &other) {
     discard();
-    target_ = std::move(other.target_);
+    if (folderFd_ >= 0) ::close(folderFd_);
+    folderFd_ = std::exchange(other.folderFd_, -1);
+    folderPath_ = std::move(other.folderPath_);
+    name_ = std::move(other.name_);
     temporary_ = std::exchange(other.temporary_, {});
     fd_ = std::exchange(other.fd_, -1);
   }
@@ -82,24 +106,25 @@ AtomicFile& AtomicFile::operator=(AtomicFile&& other) noexcept {
 
 AtomicFile::~AtomicFile() {
   discard();
+  if (folderFd_ >= 0) ::close(folderFd_);
 }
 
 void AtomicFile::discard() {
   if (fd_ >= 0) ::close(fd_);
   fd_ = -1;
-  if (!temporary_.empty()) ::unlink(temporary_.c_str());
+  if (!temporary_.empty()) ::unlinkat(folderFd_, temporary_.c_str(), 0);
   temporary_.clear();
 }
 
 std::optional<std::string> AtomicFile::write(std::span<const std::uint8_t> bytes) {
-  if (fd_ < 0) return errorText("write", target_, EBADF);
+  if (fd_ < 0) return errorText("write", target(), EBADF);
   while (!bytes.empty()) {
     const ssize_t written = ::write(fd_, bytes.data(), bytes.size());
     if (written < 0) {
       if (errno == EINTR) continue;
       const int error = errno;
       discard();
-      return errorText("write", target_, error);
+      return errorText("write", target(), error);
     }
     bytes = bytes.subspan(static_cast<std::size_t>(written));
   }
@@ -107,36 +132,32 @@ std::optional<std::string> AtomicFile::write(std::span<const std::uint8_t> bytes
 }
 
 std::optional<std::string> AtomicFile::commit() {
-  if (fd_ < 0) return errorText("write", target_, EBADF);
+  if (fd_ < 0) return errorText("write", target(), EBADF);
   // Durable content first: otherwise a crash after the rename could leave an empty file
   // under the target's name.
   if (::fsync(fd_) != 0) {
     const int error = errno;
     discard();
-    return errorText("write", target_, error);
+    return errorText("write", target(), error);
   }
   // close() of a network or FUSE file can report a deferred write error.
   const int closed = ::close(std::exchange(fd_, -1));
   if (closed != 0 && errno != EINTR) {
     const int error = errno;
     discard();
-    return errorText("write", target_, error);
+    return errorText("write", target(), error);
   }
-  if (::rename(temporary_.c_str(), target_.c_str()) != 0) {
+  if (::renameat(folderFd_, temporary_.c_str(), folderFd_, name_.c_str()) != 0) {
     const int error = errno;
     discard();
-    return errorText("replace", target_, error);
+    return errorText("replace", target(), error);
   }
   temporary_.clear();
 
-  const std::filesystem::path folder = folderOf(target_);
-  const int folderFd = ::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-  if (folderFd < 0) return errorText("open the folder of", target_, errno);
-  int error = ::fsync(folderFd) == 0 ? 0 : errno;
-  ::close(folderFd);
+  int error = ::fsync(folderFd_) == 0 ? 0 : errno;
   // Some file systems cannot fsync a folder at all; the rename is then as durable as they get.
   if (error == EINVAL || error == ENOTSUP) error = 0;
-  if (error != 0) return errorText("flush the folder of", target_, error);
+  if (error != 0) return errorText("flush the folder of", target(), error);
   return std::nullopt;
 }
 

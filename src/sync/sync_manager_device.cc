@@ -2,6 +2,8 @@
 // the folders on it.
 #include <chrono>
 #include <cstdio>
+#include <utility>
+#include <variant>
 
 #include "platform/log.h"
 #include "sync/sync_status.h"
@@ -112,33 +114,58 @@ bool ZTSyncManager::mountZeto() {
   return mounted;
 }
 
-std::optional<std::string> ZTSyncManager::checkForZetoFolder(const std::string& name,
-                                                             bool createIfNeeded) {
-  std::filesystem::path path = std::filesystem::path(_pathToZetoVolume) / name;
+std::optional<platform::FolderHandle> ZTSyncManager::checkForZetoFolder(const std::string& name,
+                                                                        bool createIfNeeded) {
   Log::debug("Checking %@ folder on Zeto", name);
-  const platform::FileSystem& files = services_.files;
-  if (files.exists(path)) {
-    if (files.isDirectory(path)) return path.string();
+  auto root = services_.files.openFolder(_pathToZetoVolume);
+  if (const std::string* reason = std::get_if<std::string>(&root)) {
+    Log::debug("Can't create folder. Reason: %@", *reason);
+    return std::nullopt;
+  }
+  const platform::FolderHandle& volume = std::get<platform::FolderHandle>(root);
+  // A link is not the player's folder even when it leads to one: following it would let the
+  // sync empty and fill a folder anywhere on the computer.
+  auto attributes = volume.attributes(name);
+  const auto* existing = std::get_if<platform::FileAttributes>(&attributes);
+  if (existing && existing->type != platform::FileType::Directory) {
     Log::debug("Folder %@ on Zeto is a regular file, we can't use it to sync", name);
     return std::nullopt;
   }
-  if (!createIfNeeded) return path.string();
-  Log::debug("Need to create %@ on Zeto", name);
-  if (auto error = files.createDirectory(path, platform::Intermediates::Create)) {
-    Log::debug("Can't create folder. Reason: %@", *error);
+  if (!existing) {
+    if (!createIfNeeded) return std::nullopt;
+    Log::debug("Need to create %@ on Zeto", name);
+  }
+  // Opened without following links, so a link put in the folder's place after the check
+  // fails here instead of leading elsewhere.
+  auto folder =
+      volume.openChild(name, existing ? platform::IfMissing::Fail : platform::IfMissing::Create);
+  if (const std::string* reason = std::get_if<std::string>(&folder)) {
+    Log::debug("Can't create folder. Reason: %@", *reason);
     return std::nullopt;
   }
-  return path.string();
+  return std::get<platform::FolderHandle>(std::move(folder));
 }
 
 bool ZTSyncManager::checkZetoPIMPaths() {
   Log::debug("Checking for PIM paths");
   if (!mountZeto()) return false;
-  setPathToZetoContactsFolder(checkForZetoFolder("Contacts", true));
-  if (_shouldSyncContacts && !_pathToZetoContactsFolder) setShouldSyncContacts(false);
-  setPathToZetoCalendarsFolder(checkForZetoFolder("Calendars", true));
-  if (_shouldSyncCalendars && !_pathToZetoCalendarsFolder) setShouldSyncCalendars(false);
+  setZetoContactsFolder(checkForZetoFolder("Contacts", true));
+  if (_shouldSyncContacts && !_zetoContactsFolder) setShouldSyncContacts(false);
+  setZetoCalendarsFolder(checkForZetoFolder("Calendars", true));
+  if (_shouldSyncCalendars && !_zetoCalendarsFolder) setShouldSyncCalendars(false);
   return true;
+}
+
+void ZTSyncManager::setZetoContactsFolder(std::optional<platform::FolderHandle> folder) {
+  _pathToZetoContactsFolder =
+      folder ? std::optional<std::string>(folder->path().string()) : std::nullopt;
+  _zetoContactsFolder = std::move(folder);
+}
+
+void ZTSyncManager::setZetoCalendarsFolder(std::optional<platform::FolderHandle> folder) {
+  _pathToZetoCalendarsFolder =
+      folder ? std::optional<std::string>(folder->path().string()) : std::nullopt;
+  _zetoCalendarsFolder = std::move(folder);
 }
 
 bool ZTSyncManager::shouldSyncContactImages() {

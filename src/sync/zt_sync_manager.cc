@@ -44,8 +44,8 @@ ZTSyncManager::~ZTSyncManager() {
   _syncSession.reset();
   _syncClient.reset();
   _pathToZetoVolume.clear();
-  _pathToZetoContactsFolder.reset();
-  _pathToZetoCalendarsFolder.reset();
+  setZetoContactsFolder(std::nullopt);
+  setZetoCalendarsFolder(std::nullopt);
 }
 
 const std::vector<std::string>& ZTSyncManager::entitiesForContacts() {

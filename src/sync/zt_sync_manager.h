@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "platform/device_library.h"
+#include "platform/folder_handle.h"
 #include "platform/value.h"
 #include "sync/data_class_syncer.h"
 #include "sync/sync_services.h"
@@ -57,8 +58,11 @@ class ZTSyncManager {
   void setZetoIsMounted(bool mounted);
   bool zetoIsMounted() const { return _forceMounted; }
 
-  // The player's folders and the contact-picture decision.
-  std::optional<std::string> checkForZetoFolder(const std::string& name, bool createIfNeeded);
+  // The player's folders and the contact-picture decision. A folder is the real folder `name`
+  // at the root of the volume, opened without following links; anything else in its place,
+  // a link included, gives none, and so does a missing folder that is not to be created.
+  std::optional<platform::FolderHandle> checkForZetoFolder(const std::string& name,
+                                                           bool createIfNeeded);
   bool checkZetoPIMPaths();
   bool shouldSyncContactImages();
 
@@ -94,18 +98,22 @@ class ZTSyncManager {
   void setShouldSyncCalendars(bool sync);
   const std::string& pathToZetoVolume() const { return _pathToZetoVolume; }
   void setPathToZetoVolume(const std::string& path) { _pathToZetoVolume = path; }
+  // The player's folders as opened by checkZetoPIMPaths: their paths for the log, and the
+  // handles every file operation on them goes through. None: the folder is not usable.
   const std::optional<std::string>& pathToZetoContactsFolder() const {
     return _pathToZetoContactsFolder;
-  }
-  void setPathToZetoContactsFolder(const std::optional<std::string>& path) {
-    _pathToZetoContactsFolder = path;
   }
   const std::optional<std::string>& pathToZetoCalendarsFolder() const {
     return _pathToZetoCalendarsFolder;
   }
-  void setPathToZetoCalendarsFolder(const std::optional<std::string>& path) {
-    _pathToZetoCalendarsFolder = path;
+  const platform::FolderHandle* zetoContactsFolder() const {
+    return _zetoContactsFolder ? &*_zetoContactsFolder : nullptr;
   }
+  const platform::FolderHandle* zetoCalendarsFolder() const {
+    return _zetoCalendarsFolder ? &*_zetoCalendarsFolder : nullptr;
+  }
+  void setZetoContactsFolder(std::optional<platform::FolderHandle> folder);
+  void setZetoCalendarsFolder(std::optional<platform::FolderHandle> folder);
   bool shouldSyncContactImagesCached() const { return _shouldSyncContactImagesCached; }
   void setShouldSyncContactImagesCached(bool cached);
   void setShouldSyncContactImages(bool sync);
@@ -135,6 +143,8 @@ class ZTSyncManager {
   std::string _pathToZetoVolume;
   std::optional<std::string> _pathToZetoCalendarsFolder;
   std::optional<std::string> _pathToZetoContactsFolder;
+  std::optional<platform::FolderHandle> _zetoCalendarsFolder;
+  std::optional<platform::FolderHandle> _zetoContactsFolder;
   std::shared_ptr<tessel::Snapshot> _snapshot;
   bool _lastUsedSyncToolWasDifferent = false;
   bool _lastUsedSyncToolWasDifferentIsCached = false;

@@ -104,6 +104,13 @@ TEST_F(CalendarsSync, WritesOneFilePerCalendarInTheUsersOrderAndEmptiesTheFolder
   fs::create_directories(calendarsFolder() / "old" / "inner");
   std::ofstream(calendarsFolder() / "stray.ics") << "BEGIN:VCALENDAR\r\n";
   std::ofstream(calendarsFolder() / "old" / "inner" / "notes.txt") << "x";
+  std::ofstream(calendarsFolder() / ".Tessel-Home.ics.tmpAbc123") << "BEGIN:VCALENDAR\r\n";
+  // Links go as links: what they lead to is not on the player.
+  const fs::path outside = folder() / "outside";
+  fs::create_directories(outside);
+  std::ofstream(outside / "mine.ics") << "x";
+  fs::create_directory_symlink(outside, calendarsFolder() / "linked");
+  fs::create_directory_symlink(outside, calendarsFolder() / "old" / "inner" / "away");
 
   const SynctoolRun run = syncClient(kClientID);
 
@@ -120,6 +127,8 @@ TEST_F(CalendarsSync, WritesOneFilePerCalendarInTheUsersOrderAndEmptiesTheFolder
   EXPECT_TRUE(contains(home, "SUMMARY:Lunch\r\nDTSTART:20070315T123000Z\r\n")) << home;
   EXPECT_TRUE(run.logged("Removing stray.ics")) << run.log;
   EXPECT_TRUE(run.logged("Removing old")) << run.log;
+  EXPECT_TRUE(run.logged("Removing linked")) << run.log;
+  EXPECT_TRUE(fs::exists(outside / "mine.ics"));
   EXPECT_TRUE(run.logged("Uploading changes for calendar 'Work/Office' to Zeto (" +
                          std::to_string(work.size()) + "l bytes)"))
       << run.log;

@@ -12,7 +12,7 @@
 #include "contacts/contacts_sync_fixture.h"
 #include "contacts/zt_contacts_syncer.h"
 #include "filters/zeto_contact_filter.h"
-#include "platform/file_system.h"
+#include "platform/folder_handle.h"
 #include "tessel/schema.h"
 
 namespace zt::contacts::testing {
@@ -48,8 +48,12 @@ TEST_F(PushDecision, TheFirstRunPushesAndRemembersTheFileItWrote) {
   EXPECT_EQ(first.lastStatus, 0);
   EXPECT_TRUE(first.logged("List of contacts to push has changed"));
   EXPECT_EQ(first.uploadingProgress, (std::vector<double>{0, 34, 68, 100, 100}));
-  const std::optional<platform::CalendarDate> date =
-      platform::FileSystem().modificationDate(vcfPath());
+  auto folder = platform::FolderHandle::open(contactsFolder());
+  ASSERT_TRUE(std::holds_alternative<platform::FolderHandle>(folder));
+  auto attributes = std::get<platform::FolderHandle>(folder).attributes("Tessel.vcf");
+  ASSERT_TRUE(std::holds_alternative<platform::FileAttributes>(attributes));
+  const std::optional<platform::CalendarDate>& date =
+      std::get<platform::FileAttributes>(attributes).modificationDate;
   ASSERT_TRUE(date);
   EXPECT_EQ(client()->setting("LastModDateForVCF"), platform::Value(*date));
   EXPECT_EQ(client()->setting("DidSyncContactImages"), platform::Value::boolean(false));

@@ -5,6 +5,7 @@
 #include <algorithm>
 #include <fstream>
 #include <string>
+#include <vector>
 
 #include "platform/device_library.h"
 #include "sync/synctool_fixture.h"
@@ -101,6 +102,70 @@ TEST_F(PlayerVolume, ARegularFileNamedContactsTurnsContactsOffButNotTheRun) {
   EXPECT_EQ(again.finalStatus(), 0);
   EXPECT_FALSE(again.logContains("Need to create")) << again.log;
   EXPECT_FALSE(again.logContains("regular file"));
+}
+
+// The names in a folder, links not followed.
+std::vector<std::string> namesIn(const fs::path& folder) {
+  std::vector<std::string> names;
+  for (const auto& entry : fs::directory_iterator(folder))
+    names.push_back(entry.path().filename().string());
+  std::sort(names.begin(), names.end());
+  return names;
+}
+
+TEST_F(PlayerVolume, ALinkInPlaceOfAFolderTurnsItsDataClassOffAndLeadsNowhere) {
+  registerClient(kClientID, true, true);
+  std::ofstream(folder() / "records.jsonl")
+      << R"({"id": "cal-home", "record": {"tessel.record.entity": "tessel.calendars.Calendar", "title": "Home"}})"
+      << "\n";
+  const TesselRun put = runTessel({"records", "put", (folder() / "records.jsonl").string()});
+  ASSERT_EQ(put.exitStatus, 0) << put.output;
+
+  // A link to a folder of the user's, as a player formatted on another system may hold.
+  const fs::path outside = folder() / "outside";
+  for (const std::string linked : {"Contacts", "Calendars"}) {
+    SCOPED_TRACE(linked);
+    fs::remove_all(volume());
+    fs::create_directories(volume());
+    fs::remove_all(outside);
+    fs::create_directories(outside);
+    std::ofstream(outside / "mine.txt") << "the user's";
+    fs::create_directory_symlink(outside, volume() / linked);
+
+    const SynctoolRun run = syncClient(kClientID);
+
+    EXPECT_EQ(run.exitStatus, 0);
+    EXPECT_EQ(run.finalStatus(), 0) << run.log;
+    EXPECT_TRUE(
+        run.logged("Folder " + linked + " on Zeto is a regular file, we can't use it to sync"))
+        << run.log;
+    EXPECT_EQ(namesIn(outside), std::vector<std::string>{"mine.txt"});
+    EXPECT_EQ(readFile(outside / "mine.txt"), "the user's");
+    EXPECT_TRUE(fs::is_symlink(volume() / linked));
+    // The other data class syncs as usual.
+    const fs::path other = linked == "Contacts" ? volume() / "Calendars" / "Tessel-Home.ics"
+                                                : volume() / "Contacts" / "Tessel.vcf";
+    EXPECT_TRUE(fs::is_regular_file(other)) << run.log;
+  }
+}
+
+TEST_F(PlayerVolume, TemporariesLeftByAnInterruptedWriteAreRemovedByTheNextPush) {
+  registerClient(kClientID, true, true);
+  fs::create_directories(volume() / "Contacts");
+  fs::create_directories(volume() / "Calendars");
+  // What a run killed between the write and the rename leaves, and names that only look alike.
+  for (const char* name :
+       {".Tessel.vcf.tmpAbc123", ".Tessel.vcf.tmp", ".Tessel.vcf.tmpAbc1234", "notes.txt"})
+    std::ofstream(volume() / "Contacts" / name) << "BEGIN:VCARD";
+  std::ofstream(volume() / "Calendars" / ".Tessel-Home.ics.tmpXyz789") << "BEGIN:VCALENDAR";
+
+  const SynctoolRun run = syncClient(kClientID);
+
+  EXPECT_EQ(run.finalStatus(), 0) << run.log;
+  EXPECT_EQ(namesIn(volume() / "Contacts"),
+            (std::vector<std::string>{".Tessel.vcf.tmp", ".Tessel.vcf.tmpAbc1234", "Tessel.vcf",
+                                      "notes.txt"}));
+  EXPECT_TRUE(namesIn(volume() / "Calendars").empty());
 }
 
 using PlayerLock = SynctoolTest;

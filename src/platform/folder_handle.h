@@ -1,0 +1,80 @@
+#pragma once
+
+#include <cstdint>
+#include <filesystem>
+#include <optional>
+#include <span>
+#include <string>
+#include <variant>
+#include <vector>
+
+#include "platform/calendar_date.h"
+
+namespace zt::platform {
+
+// What a name in a folder is. A symbolic link is a Link, whatever it points to.
+enum class FileType { Regular, Directory, Link, Other };
+
+struct FileAttributes {
+  FileType type = FileType::Other;
+  std::uint64_t size = 0;
+  // Read at full precision, in GMT, so a date stored earlier compares equal to the one read
+  // from the untouched file later; absent when the file system keeps none.
+  std::optional<CalendarDate> modificationDate;
+};
+
+enum class IfMissing { Create, Fail };
+
+// One open folder, and every operation on the names in it made relative to its descriptor
+// (openat(2), mkdirat(2), renameat(2), unlinkat(2), statx(2) with AT_SYMLINK_NOFOLLOW).
+// Once open, the folder cannot be redirected: renaming it or putting a symbolic link in its
+// place leaves the handle on the folder it opened, and no operation follows a link found in
+// it. Names are single path components. Every failure is answered with a human-readable
+// description naming the path and the system's reason ("Cannot remove /v/Calendars/x: ...").
+class FolderHandle {
+ public:
+  // Opens the folder at `path`, following links on the way: this is the place the system
+  // chose (a volume's mount point), not a name found on the volume.
+  static std::variant<FolderHandle, std::string> open(const std::filesystem::path& path);
+
+  FolderHandle(FolderHandle&& other) noexcept;
+  FolderHandle& operator=(FolderHandle&& other) noexcept;
+  FolderHandle(const FolderHandle&) = delete;
+  FolderHandle& operator=(const FolderHandle&) = delete;
+  ~FolderHandle();
+
+  // The folder `name` in this one, never through a symbolic link (O_DIRECTORY|O_NOFOLLOW).
+  // With IfMissing::Create a missing folder is created first.
+  std::variant<FolderHandle, std::string> openChild(const std::string& name,
+                                                    IfMissing ifMissing) const;
+
+  // The names of the entries (dot files included, "." and ".." not), sorted by byte value.
+  std::variant<std::vector<std::string>, std::string> entries() const;
+  // Type, size and modification date of the entry itself, a link not followed.
+  std::variant<FileAttributes, std::string> attributes(const std::string& name) const;
+  // Removes the entry: a link as a link, a folder with everything in it, descending only into
+  // real folders.
+  std::optional<std::string> remove(const std::string& name) const;
+
+  // Replaces the file `name` with `bytes` so that readers, and the device after a power
+  // loss, see either the old content or the whole new one (see AtomicFile). On failure the
+  // old file is untouched and no temporary file is left.
+  std::optional<std::string> atomicWrite(const std::string& name,
+                                         std::span<const std::uint8_t> bytes) const;
+  // Removes the regular files that an interrupted atomicWrite of `name` left behind. Only the
+  // caller can know that no other writer of `name` is at work.
+  std::optional<std::string> removeStaleTemporaries(const std::string& name) const;
+
+  // The path the folder was opened by, for messages and logs.
+  const std::filesystem::path& path() const { return path_; }
+  // The folder's own descriptor, for the operations of AtomicFile; owned by the handle.
+  int descriptor() const { return fd_; }
+
+ private:
+  FolderHandle(std::filesystem::path path, int fd);
+
+  std::filesystem::path path_;
+  int fd_ = -1;
+};
+
+}  // namespace zt::platform

@@ -1,0 +1,299 @@
+#include "platform/folder_handle.h"
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <fstream>
+#include <iterator>
+#include <string>
+#include <vector>
+
+#include "platform/atomic_file.h"
+#include "platform/temporary_folder.h"
+
+namespace zt::platform {
+namespace {
+
+using test_support::TemporaryFolder;
+namespace fs = std::filesystem;
+
+std::vector<std::uint8_t> bytesOf(std::string_view text) {
+  return std::vector<std::uint8_t>(text.begin(), text.end());
+}
+
+std::string contentsOf(const fs::path& path) {
+  std::ifstream file(path, std::ios::binary);
+  return std::string(std::istreambuf_iterator<char>(file), {});
+}
+
+void writeFile(const fs::path& path, std::string_view text) {
+  std::ofstream(path, std::ios::binary) << text;
+}
+
+// The names in a folder as the system lists them, links not followed.
+std::vector<std::string> namesIn(const fs::path& folder) {
+  std::vector<std::string> names;
+  for (const auto& entry : fs::directory_iterator(folder))
+    names.push_back(entry.path().filename().string());
+  std::sort(names.begin(), names.end());
+  return names;
+}
+
+FolderHandle openFolder(const fs::path& path) {
+  auto opened = FolderHandle::open(path);
+  if (auto* error = std::get_if<std::string>(&opened)) ADD_FAILURE() << *error;
+  return std::get<FolderHandle>(std::move(opened));
+}
+
+class AtomicWriteTest : public ::testing::Test {
+ protected:
+  TemporaryFolder folder;
+  FolderHandle handle = openFolder(folder.path());
+};
+
+TEST_F(AtomicWriteTest, CreatesAndReplacesWholeFilesWithoutLeavingTemporaries) {
+  ASSERT_EQ(handle.atomicWrite("Tessel.vcf", bytesOf("first version, rather long")), std::nullopt);
+  EXPECT_EQ(contentsOf(folder / "Tessel.vcf"), "first version, rather long");
+
+  ASSERT_EQ(handle.atomicWrite("Tessel.vcf", bytesOf("short")), std::nullopt);
+  EXPECT_EQ(contentsOf(folder / "Tessel.vcf"), "short");
+
+  // An empty buffer still gives a file, an empty one.
+  ASSERT_EQ(handle.atomicWrite("Tessel.vcf", {}), std::nullopt);
+  EXPECT_TRUE(fs::is_regular_file(folder / "Tessel.vcf"));
+  EXPECT_EQ(fs::file_size(folder / "Tessel.vcf"), 0u);
+
+  EXPECT_EQ(namesIn(folder.path()), std::vector<std::string>{"Tessel.vcf"});
+}
+
+TEST_F(AtomicWriteTest, LargeBuffersArriveWhole) {
+  std::vector<std::uint8_t> bytes(9 * 1024 * 1024 + 17);
+  for (std::size_t i = 0; i < bytes.size(); ++i) bytes[i] = static_cast<std::uint8_t>(i * 31 + 7);
+  ASSERT_EQ(handle.atomicWrite("big.ics", bytes), std::nullopt);
+  const std::string written = contentsOf(folder / "big.ics");
+  ASSERT_EQ(written.size(), bytes.size());
+  EXPECT_TRUE(std::equal(bytes.begin(), bytes.end(), written.begin(),
+                         [](std::uint8_t b, char c) { return b == static_cast<std::uint8_t>(c); }));
+}
+
+TEST_F(AtomicWriteTest, WrittenFilesGetTheUsualPermissions) {
+  const mode_t previous = ::umask(022);
+  const auto error = handle.atomicWrite("Tessel-Home.ics", bytesOf("BEGIN:VCALENDAR"));
+  ::umask(previous);
+  ASSERT_EQ(error, std::nullopt);
+  struct stat info {};
+  ASSERT_EQ(::stat((folder / "Tessel-Home.ics").c_str(), &info), 0);
+  EXPECT_EQ(info.st_mode & 0777, 0644u);
+}
+
+TEST_F(AtomicWriteTest, NamesAtTheLengthLimitStillWork) {
+  const std::string name = "Tessel-" + std::string(240, 'x') + ".ics";  // 251 bytes
+  ASSERT_EQ(handle.atomicWrite(name, bytesOf("x")), std::nullopt);
+  EXPECT_EQ(namesIn(folder.path()), std::vector<std::string>{name});
+  // Shortening the temporary name never cuts a UTF-8 character in half.
+  std::string wide = "Tessel-";
+  while (wide.size() < 248) wide += "\xC3\xA9";  // é
+  ASSERT_EQ(handle.atomicWrite(wide, bytesOf("y")), std::nullopt);
+  EXPECT_EQ(contentsOf(folder / wide), "y");
+}
+
+TEST_F(AtomicWriteTest, AFailedRenameKeepsTheTargetAndRemovesTheTemporaryFile) {
+  // A folder in the target's place: the content is written, then the rename fails.
+  fs::create_directory(folder / "Calendars");
+  writeFile(folder / "Calendars" / "inside.ics", "kept");
+
+  const auto error = handle.atomicWrite("Calendars", bytesOf("new content"));
+  ASSERT_TRUE(error.has_value());
+  EXPECT_NE(error->find((folder / "Calendars").string()), std::string::npos) << *error;
+  EXPECT_EQ(contentsOf(folder / "Calendars" / "inside.ics"), "kept");
+  EXPECT_EQ(namesIn(folder.path()), std::vector<std::string>{"Calendars"});
+}
+
+TEST_F(AtomicWriteTest, AReadOnlyFolderKeepsTheOldFile) {
+  if (::geteuid() == 0) GTEST_SKIP() << "root writes into read-only folders";
+  ASSERT_EQ(handle.atomicWrite("Tessel.vcf", bytesOf("old")), std::nullopt);
+  fs::permissions(folder.path(), fs::perms::owner_read | fs::perms::owner_exec);
+  const auto error = handle.atomicWrite("Tessel.vcf", bytesOf("new"));
+  fs::permissions(folder.path(), fs::perms::owner_all);
+  ASSERT_TRUE(error.has_value());
+  EXPECT_NE(error->find("Permission denied"), std::string::npos) << *error;
+  EXPECT_EQ(contentsOf(folder / "Tessel.vcf"), "old");
+  EXPECT_EQ(namesIn(folder.path()), std::vector<std::string>{"Tessel.vcf"});
+}
+
+TEST_F(AtomicWriteTest, AnAtomicFileThatIsNotCommittedChangesNothing) {
+  writeFile(folder / "Tessel.vcf", "old");
+  {
+    auto created = AtomicFile::create(handle, "Tessel.vcf");
+    ASSERT_TRUE(std::holds_alternative<AtomicFile>(created));
+    AtomicFile file = std::move(std::get<AtomicFile>(created));
+    ASSERT_EQ(file.write(bytesOf("half of the new")), std::nullopt);
+    EXPECT_EQ(file.temporaryPath().parent_path(), folder.path());
+    const std::string temporary = file.temporaryPath().filename().string();
+    EXPECT_TRUE(AtomicFile::isTemporaryName(temporary, "Tessel.vcf")) << temporary;
+    EXPECT_TRUE(fs::exists(file.temporaryPath()));
+  }
+  EXPECT_EQ(contentsOf(folder / "Tessel.vcf"), "old");
+  EXPECT_EQ(namesIn(folder.path()), std::vector<std::string>{"Tessel.vcf"});
+}
+
+TEST_F(AtomicWriteTest, OnlyStaleTemporariesOfTheNamedFileAreRemoved) {
+  const fs::path outside = folder / "outside";
+  fs::create_directory(outside);
+  const FolderHandle contacts =
+      std::get<FolderHandle>(handle.openChild("Contacts", IfMissing::Create));
+  const fs::path in = folder / "Contacts";
+  for (const char* name :
+       {".Tessel.vcf.tmpAbc123", ".Tessel.vcf.tmpZZZZZZ", ".Tessel.vcf.tmp", ".Tessel.vcf.tmpAbc12",
+        ".Tessel.vcf.tmpAbc1234", ".Tessel.vcf.tmpAb-123", ".Other.vcf.tmpAbc123", "Tessel.vcf"})
+    writeFile(in / name, "x");
+  fs::create_directory(in / ".Tessel.vcf.tmpDir123");
+  writeFile(outside / "kept", "x");
+  fs::create_directory_symlink(outside, in / ".Tessel.vcf.tmpLnk123");
+
+  ASSERT_EQ(contacts.removeStaleTemporaries("Tessel.vcf"), std::nullopt);
+  EXPECT_EQ(namesIn(in), (std::vector<std::string>{
+                             ".Other.vcf.tmpAbc123", ".Tessel.vcf.tmp", ".Tessel.vcf.tmpAb-123",
+                             ".Tessel.vcf.tmpAbc12", ".Tessel.vcf.tmpAbc1234",
+                             ".Tessel.vcf.tmpDir123", ".Tessel.vcf.tmpLnk123", "Tessel.vcf"}));
+  EXPECT_EQ(namesIn(outside), std::vector<std::string>{"kept"});
+}
+
+class FolderHandleTest : public ::testing::Test {
+ protected:
+  TemporaryFolder folder;
+  FolderHandle handle = openFolder(folder.path());
+};
+
+TEST_F(FolderHandleTest, ModificationDateIsExactAndStable) {
+  ASSERT_EQ(handle.atomicWrite("Tessel.vcf", bytesOf("BEGIN:VCARD")), std::nullopt);
+  const auto dateOf = [&] {
+    auto attributes = handle.attributes("Tessel.vcf");
+    EXPECT_TRUE(std::holds_alternative<FileAttributes>(attributes));
+    return std::get<FileAttributes>(attributes).modificationDate;
+  };
+  const auto written = dateOf();
+  ASSERT_TRUE(written.has_value());
+  EXPECT_EQ(written->timeZone(), TimeZone::gmt());
+  EXPECT_EQ(dateOf(), written);
+
+  // Nanoseconds are kept: a stored date and a later read compare equal only if they are.
+  const timespec times[2] = {{1700000000, 123456789}, {1700000000, 987654321}};
+  ASSERT_EQ(::utimensat(AT_FDCWD, (folder / "Tessel.vcf").c_str(), times, 0), 0);
+  auto attributes = handle.attributes("Tessel.vcf");
+  ASSERT_TRUE(std::holds_alternative<FileAttributes>(attributes));
+  const auto& read = std::get<FileAttributes>(attributes);
+  EXPECT_EQ(read.type, FileType::Regular);
+  EXPECT_EQ(read.size, 11u);
+  ASSERT_TRUE(read.modificationDate.has_value());
+  EXPECT_EQ(read.modificationDate->instant().time_since_epoch().count(), 1700000000);
+  EXPECT_EQ(read.modificationDate->nanoseconds(), 987654321u);
+  EXPECT_EQ(read.modificationDate->description(), "2023-11-14 22:13:20 +0000");
+  EXPECT_FALSE(read.modificationDate->isSameInstant(*written));
+
+  auto missing = handle.attributes("absent.vcf");
+  ASSERT_TRUE(std::holds_alternative<std::string>(missing));
+  EXPECT_EQ(std::get<std::string>(missing), "Cannot read the attributes of " +
+                                                (folder / "absent.vcf").string() +
+                                                ": No such file or directory");
+}
+
+TEST_F(FolderHandleTest, ChildFoldersAreOpenedOrCreatedButNeverThroughALink) {
+  const fs::path outside = folder / "outside";
+  fs::create_directory(outside);
+  writeFile(folder / "File", "a file, not a folder");
+  fs::create_directory_symlink(outside, folder / "Link");
+  fs::create_symlink(folder / "absent", folder / "Dangling");
+
+  auto created = handle.openChild("Contacts", IfMissing::Create);
+  ASSERT_TRUE(std::holds_alternative<FolderHandle>(created)) << std::get<std::string>(created);
+  EXPECT_EQ(std::get<FolderHandle>(created).path(), folder / "Contacts");
+  EXPECT_TRUE(fs::is_directory(folder / "Contacts"));
+  EXPECT_TRUE(std::holds_alternative<FolderHandle>(handle.openChild("Contacts", IfMissing::Fail)));
+
+  auto attributes = handle.attributes("Link");
+  ASSERT_TRUE(std::holds_alternative<FileAttributes>(attributes));
+  EXPECT_EQ(std::get<FileAttributes>(attributes).type, FileType::Link);
+
+  const struct {
+    const char* name;
+    IfMissing ifMissing;
+    const char* reason;
+  } refused[] = {
+      {"Absent", IfMissing::Fail, "No such file or directory"},
+      {"File", IfMissing::Create, "Not a directory"},
+      // O_NOFOLLOW with O_DIRECTORY: a link is not a folder (open(2)).
+      {"Link", IfMissing::Create, "Not a directory"},
+      {"Dangling", IfMissing::Create, "Not a directory"},
+  };
+  for (const auto& entry : refused) {
+    SCOPED_TRACE(entry.name);
+    auto opened = handle.openChild(entry.name, entry.ifMissing);
+    ASSERT_TRUE(std::holds_alternative<std::string>(opened));
+    EXPECT_EQ(std::get<std::string>(opened),
+              "Cannot open the folder " + (folder / entry.name).string() + ": " + entry.reason);
+  }
+  EXPECT_TRUE(namesIn(outside).empty());
+  EXPECT_FALSE(fs::exists(folder / "absent"));
+}
+
+TEST_F(FolderHandleTest, RemovalTakesFoldersWholeAndLinksAsLinks) {
+  // Files outside the folder that links inside it lead to.
+  const fs::path outside = folder / "outside";
+  fs::create_directories(outside / "sub");
+  writeFile(outside / "mine.ics", "x");
+  writeFile(outside / "sub" / "deeper.ics", "x");
+  fs::create_directory(folder / "Calendars");
+  const FolderHandle calendars =
+      std::get<FolderHandle>(handle.openChild("Calendars", IfMissing::Fail));
+  const fs::path in = folder / "Calendars";
+  fs::create_directories(in / "stray" / "deeper");
+  writeFile(in / "stray" / "deeper" / "x.ics", "x");
+  fs::create_directory_symlink(outside, in / "stray" / "deeper" / "away");
+  fs::create_symlink(outside / "mine.ics", in / "stray" / "file-link");
+  fs::create_directory_symlink(outside, in / "linked");
+  writeFile(in / "Tessel-Work.ics", "w");
+  writeFile(in / ".hidden", "");
+
+  auto listing = calendars.entries();
+  ASSERT_TRUE(std::holds_alternative<std::vector<std::string>>(listing));
+  EXPECT_EQ(std::get<std::vector<std::string>>(listing),
+            (std::vector<std::string>{".hidden", "Tessel-Work.ics", "linked", "stray"}));
+
+  for (const char* name : {"linked", "stray", "Tessel-Work.ics"})
+    EXPECT_EQ(calendars.remove(name), std::nullopt) << name;
+  EXPECT_EQ(namesIn(in), std::vector<std::string>{".hidden"});
+  EXPECT_EQ(namesIn(outside), (std::vector<std::string>{"mine.ics", "sub"}));
+  EXPECT_EQ(namesIn(outside / "sub"), std::vector<std::string>{"deeper.ics"});
+
+  EXPECT_EQ(calendars.remove("absent"),
+            "Cannot remove " + (in / "absent").string() + ": No such file or directory");
+}
+
+TEST_F(FolderHandleTest, AFolderSwappedForALinkAfterOpeningCannotRedirectTheHandle) {
+  const fs::path outside = folder / "outside";
+  fs::create_directory(outside);
+  const FolderHandle calendars =
+      std::get<FolderHandle>(handle.openChild("Calendars", IfMissing::Create));
+  writeFile(folder / "Calendars" / "old.ics", "old");
+  fs::rename(folder / "Calendars", folder / "moved");
+  fs::create_directory_symlink(outside, folder / "Calendars");
+  writeFile(outside / "theirs.ics", "theirs");
+
+  ASSERT_EQ(calendars.atomicWrite("Tessel-Home.ics", bytesOf("home")), std::nullopt);
+  auto listing = calendars.entries();
+  ASSERT_TRUE(std::holds_alternative<std::vector<std::string>>(listing));
+  EXPECT_EQ(std::get<std::vector<std::string>>(listing),
+            (std::vector<std::string>{"Tessel-Home.ics", "old.ics"}));
+  EXPECT_EQ(calendars.remove("old.ics"), std::nullopt);
+  EXPECT_TRUE(calendars.remove("theirs.ics").has_value());
+
+  EXPECT_EQ(namesIn(folder / "moved"), std::vector<std::string>{"Tessel-Home.ics"});
+  EXPECT_EQ(contentsOf(folder / "moved" / "Tessel-Home.ics"), "home");
+  EXPECT_EQ(namesIn(outside), std::vector<std::string>{"theirs.ics"});
+}
+
+}  // namespace
+}  // namespace zt::platform
