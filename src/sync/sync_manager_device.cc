@@ -114,13 +114,20 @@ bool ZTSyncManager::mountZeto() {
   return mounted;
 }
 
-std::optional<platform::FolderHandle> ZTSyncManager::checkForZetoFolder(const std::string& name,
-                                                                        bool createIfNeeded) {
+std::optional<std::string> ZTSyncManager::checkForZetoFolder(const std::string& name,
+                                                             bool createIfNeeded) {
+  ZetoFolder folder = openZetoFolder(name, createIfNeeded);
+  if (!folder.opened && !folder.missing) return std::nullopt;
+  return (std::filesystem::path(_pathToZetoVolume) / name).string();
+}
+
+ZTSyncManager::ZetoFolder ZTSyncManager::openZetoFolder(const std::string& name,
+                                                        bool createIfNeeded) {
   Log::debug("Checking %@ folder on Zeto", name);
   auto root = services_.files.openFolder(_pathToZetoVolume);
   if (const std::string* reason = std::get_if<std::string>(&root)) {
     Log::debug("Can't create folder. Reason: %@", *reason);
-    return std::nullopt;
+    return {};
   }
   const platform::FolderHandle& volume = std::get<platform::FolderHandle>(root);
   // A link is not the player's folder even when it leads to one: following it would let the
@@ -129,10 +136,10 @@ std::optional<platform::FolderHandle> ZTSyncManager::checkForZetoFolder(const st
   const auto* existing = std::get_if<platform::FileAttributes>(&attributes);
   if (existing && existing->type != platform::FileType::Directory) {
     Log::debug("Folder %@ on Zeto is a regular file, we can't use it to sync", name);
-    return std::nullopt;
+    return {};
   }
   if (!existing) {
-    if (!createIfNeeded) return std::nullopt;
+    if (!createIfNeeded) return {.opened = std::nullopt, .missing = true};
     Log::debug("Need to create %@ on Zeto", name);
   }
   // Opened without following links, so a link put in the folder's place after the check
@@ -141,17 +148,17 @@ std::optional<platform::FolderHandle> ZTSyncManager::checkForZetoFolder(const st
       volume.openChild(name, existing ? platform::IfMissing::Fail : platform::IfMissing::Create);
   if (const std::string* reason = std::get_if<std::string>(&folder)) {
     Log::debug("Can't create folder. Reason: %@", *reason);
-    return std::nullopt;
+    return {};
   }
-  return std::get<platform::FolderHandle>(std::move(folder));
+  return {.opened = std::get<platform::FolderHandle>(std::move(folder))};
 }
 
 bool ZTSyncManager::checkZetoPIMPaths() {
   Log::debug("Checking for PIM paths");
   if (!mountZeto()) return false;
-  setZetoContactsFolder(checkForZetoFolder("Contacts", true));
+  setZetoContactsFolder(openZetoFolder("Contacts", true).opened);
   if (_shouldSyncContacts && !_zetoContactsFolder) setShouldSyncContacts(false);
-  setZetoCalendarsFolder(checkForZetoFolder("Calendars", true));
+  setZetoCalendarsFolder(openZetoFolder("Calendars", true).opened);
   if (_shouldSyncCalendars && !_zetoCalendarsFolder) setShouldSyncCalendars(false);
   return true;
 }

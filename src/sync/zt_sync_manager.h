@@ -58,11 +58,10 @@ class ZTSyncManager {
   void setZetoIsMounted(bool mounted);
   bool zetoIsMounted() const { return _forceMounted; }
 
-  // The player's folders and the contact-picture decision. A folder is the real folder `name`
-  // at the root of the volume, opened without following links; anything else in its place,
-  // a link included, gives none, and so does a missing folder that is not to be created.
-  std::optional<platform::FolderHandle> checkForZetoFolder(const std::string& name,
-                                                           bool createIfNeeded);
+  // The player's folders and the contact-picture decision. The path of the real folder
+  // `name` at the root of the volume (created when missing and asked for), or of the missing
+  // folder that was not to be created; none for anything else in its place, a link included.
+  std::optional<std::string> checkForZetoFolder(const std::string& name, bool createIfNeeded);
   bool checkZetoPIMPaths();
   bool shouldSyncContactImages();
 
@@ -122,6 +121,13 @@ class ZTSyncManager {
 
  private:
   void _cacheShouldSyncContactImages();
+  // What checkForZetoFolder finds: the folder opened without following links, so that a link
+  // put in its place later cannot lead anywhere; or nothing, with whether nothing was there.
+  struct ZetoFolder {
+    std::optional<platform::FolderHandle> opened;
+    bool missing = false;
+  };
+  ZetoFolder openZetoFolder(const std::string& name, bool createIfNeeded);
 
   SyncServices services_;
   std::unique_ptr<tessel::Store> store_;
