@@ -54,6 +54,8 @@ struct SynctoolRun {
   double seconds = 0;   // wall time of the run
   std::string log;      // the whole log file; empty when nothing was logged
   std::vector<std::string> logLines;
+  // When each log line came, in seconds after the start; only for a run watched to be killed.
+  std::vector<double> logLineSeconds;
   std::vector<Json> notifications;  // the notification log, one object per line, in order
   std::string standardError;        // standard output and standard error together
 
@@ -74,6 +76,14 @@ struct SynctoolRun {
 Json expectedNotification(std::string_view sender, std::string_view phase, double percent,
                           std::optional<std::int64_t> status = std::nullopt,
                           std::optional<std::vector<std::string>> dataClasses = std::nullopt);
+
+// Where a run is cut short with SIGKILL: that many seconds (none: at once) after the tool
+// wrote its n-th log line (counting from 1), or after it started when no line is given.
+// Neither given: the run is watched the same way but not killed.
+struct KillAt {
+  std::optional<std::size_t> logLine;
+  std::optional<double> seconds;
+};
 
 // Each test gets a fresh folder holding the engine's store, a volume folder, a virtual device
 // file with one mounted player (kPlayerID) on that volume, and the tool's defaults file with
@@ -116,6 +126,9 @@ class SynctoolTest : public ::testing::Test {
   // Runs zetosynctool with these arguments (the program name is added) and collects what it
   // left. The log and notification files are emptied first, so each run is seen alone.
   SynctoolRun runSynctool(const std::vector<std::string>& arguments);
+  // The same run, killed at that moment if it is still going; the log then goes through a
+  // pipe, so a line is seen as soon as the tool wrote it.
+  SynctoolRun runSynctool(const std::vector<std::string>& arguments, const KillAt& kill);
   SynctoolRun syncClient(std::string_view clientID) {
     return runSynctool({"--oneshot", "--sync", std::string(clientID)});
   }
@@ -129,6 +142,9 @@ class SynctoolTest : public ::testing::Test {
   TesselRun runTessel(const std::vector<std::string>& arguments);
 
  private:
+  SynctoolRun runWatched(const std::vector<std::string>& arguments,
+                         const std::optional<KillAt>& kill);
+
   fs::path folder_;
   std::unique_ptr<tessel::Store> store_;
   bool useSessionBus_ = false;
