@@ -4,6 +4,7 @@
 #include <poll.h>
 #include <signal.h>
 #include <stdlib.h>
+#include <sys/inotify.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -203,6 +204,16 @@ int runProgram(std::vector<std::string> words, std::optional<std::vector<std::st
     envp.push_back(nullptr);
   }
   const std::string outFile = output.string();
+  // File events are watched from before the start, so none is missed.
+  int fileEvents = -1;
+  std::size_t events = 0;
+  if (kill && kill->folder) {
+    fileEvents = ::inotify_init1(IN_NONBLOCK | IN_CLOEXEC);
+    if (fileEvents < 0 ||
+        ::inotify_add_watch(fileEvents, kill->folder->c_str(), kill->fileEvents) < 0) {
+      ADD_FAILURE() << "cannot watch " << *kill->folder;
+    }
+  }
   const auto start = std::chrono::steady_clock::now();
   const pid_t pid = ::fork();
   if (pid == 0) {
@@ -229,7 +240,22 @@ int runProgram(std::vector<std::string> words, std::optional<std::vector<std::st
     return std::chrono::duration_cast<Clock::duration>(std::chrono::duration<double>(seconds));
   };
   std::optional<Clock::time_point> killTime;
-  if (kill && !kill->logLine && kill->seconds) killTime = start + after(*kill->seconds);
+  if (kill && !kill->logLine && !kill->folder && kill->seconds) {
+    killTime = start + after(*kill->seconds);
+  }
+  const auto readEvents = [&](Clock::time_point now) {
+    alignas(inotify_event) char buffer[4096];
+    ssize_t got;
+    while ((got = ::read(fileEvents, buffer, sizeof buffer)) > 0) {
+      for (ssize_t at = 0; at < got;) {
+        const auto* event = reinterpret_cast<const inotify_event*>(buffer + at);
+        if ((event->mask & kill->fileEvents) != 0 && ++events == kill->eventCount && !killTime) {
+          killTime = now + after(*kill->seconds);
+        }
+        at += static_cast<ssize_t>(sizeof(inotify_event) + event->len);
+      }
+    }
+  };
   const auto readLog = [&](Clock::time_point now) {
     char buffer[65536];
     ssize_t got;
@@ -238,8 +264,8 @@ int runProgram(std::vector<std::string> words, std::optional<std::vector<std::st
       for (ssize_t i = 0; i < got; ++i) {
         if (buffer[i] != '\n') continue;
         lineSeconds->push_back(std::chrono::duration<double>(now - start).count());
-        if (!killTime && kill->logLine && lineSeconds->size() == *kill->logLine) {
-          killTime = now + after(kill->seconds.value_or(0));
+        if (!killTime && kill->logLine && kill->seconds && lineSeconds->size() == *kill->logLine) {
+          killTime = now + after(*kill->seconds);
         }
       }
     }
@@ -248,6 +274,7 @@ int runProgram(std::vector<std::string> words, std::optional<std::vector<std::st
   while (::waitpid(pid, &status, WNOHANG) != pid) {
     const auto now = Clock::now();
     if (logPipe >= 0) readLog(now);
+    if (fileEvents >= 0) readEvents(now);
     const bool due = killTime && now >= *killTime;
     if (due || now - start > kRunDeadline) {
       ::kill(pid, SIGKILL);
@@ -255,17 +282,18 @@ int runProgram(std::vector<std::string> words, std::optional<std::vector<std::st
       if (!due) ADD_FAILURE() << words[0] << " did not end in time and was killed";
       break;
     }
-    // A run that may be cut short is watched closely, so the kill lands where it was aimed.
-    auto wait = kill ? std::chrono::duration_cast<Clock::duration>(std::chrono::milliseconds(1))
-                     : std::chrono::duration_cast<Clock::duration>(std::chrono::milliseconds(10));
-    if (killTime) wait = std::min(wait, *killTime - now);
-    const auto waitNanoseconds = std::chrono::duration_cast<std::chrono::nanoseconds>(wait).count();
-    const timespec timeout{static_cast<time_t>(waitNanoseconds / 1000000000),
-                           static_cast<long>(waitNanoseconds % 1000000000)};
-    pollfd ready{logPipe, POLLIN, 0};
-    ::ppoll(&ready, logPipe >= 0 ? 1 : 0, &timeout, nullptr);
+    if (logPipe < 0) {
+      std::this_thread::sleep_for(std::chrono::milliseconds(10));
+      continue;
+    }
+    // A run that may be cut short is watched closely: the last millisecond before the kill is
+    // spun through, so the kill lands where it was aimed.
+    pollfd ready[2] = {{logPipe, POLLIN, 0}, {fileEvents, POLLIN, 0}};
+    ::poll(ready, fileEvents >= 0 ? 2 : 1,
+           killTime && *killTime - now < std::chrono::milliseconds(1) ? 0 : 1);
   }
   if (logPipe >= 0) readLog(Clock::now());
+  if (fileEvents >= 0) ::close(fileEvents);
   return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
 }
 

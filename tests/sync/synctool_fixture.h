@@ -77,12 +77,36 @@ Json expectedNotification(std::string_view sender, std::string_view phase, doubl
                           std::optional<std::int64_t> status = std::nullopt,
                           std::optional<std::vector<std::string>> dataClasses = std::nullopt);
 
-// Where a run is cut short with SIGKILL: that many seconds (none: at once) after the tool
-// wrote its n-th log line (counting from 1), or after it started when no line is given.
-// Neither given: the run is watched the same way but not killed.
+// Where a run is cut short with SIGKILL: `seconds` after the tool wrote its n-th log line
+// (counting from 1), or after the n-th file event of `fileEvents` (an inotify mask: IN_CREATE,
+// IN_CLOSE_WRITE...) on a file of `folder`, or after the start when neither is given. A
+// watched run (the default) is followed the same way but not killed.
 struct KillAt {
+  static KillAt afterLogLine(std::size_t n, double seconds = 0) {
+    KillAt at;
+    at.logLine = n;
+    at.seconds = seconds;
+    return at;
+  }
+  static KillAt afterFileEvent(fs::path folder, std::uint32_t fileEvents, std::size_t n = 1) {
+    KillAt at;
+    at.folder = std::move(folder);
+    at.fileEvents = fileEvents;
+    at.eventCount = n;
+    at.seconds = 0;
+    return at;
+  }
+  static KillAt afterStart(double seconds) {
+    KillAt at;
+    at.seconds = seconds;
+    return at;
+  }
+
   std::optional<std::size_t> logLine;
-  std::optional<double> seconds;
+  std::optional<fs::path> folder;
+  std::uint32_t fileEvents = 0;
+  std::size_t eventCount = 1;
+  std::optional<double> seconds;  // none: never killed
 };
 
 // Each test gets a fresh folder holding the engine's store, a volume folder, a virtual device
