@@ -1,8 +1,11 @@
 #include "sync/synctool_fixture.h"
 
 #include <fcntl.h>
+#include <poll.h>
 #include <signal.h>
 #include <stdlib.h>
+#include <sys/inotify.h>
+#include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -184,10 +187,14 @@ std::map<std::string, std::string> SynctoolTest::environment() const {
 namespace {
 
 // Runs `words` with `environment` (none: this process's), standard input from /dev/null and
-// standard output and error into `output`, killing it after kRunDeadline; its exit status,
-// 128 + signal when it was killed.
+// standard output and error into `output`, killing it after kRunDeadline, or at `kill` when
+// given; its exit status, 128 + signal when it was killed. `logPipe`, when open, is the read
+// end of the pipe the program logs into: what it carries is appended to `log` as it comes,
+// and the time each line came to `lineSeconds`.
 int runProgram(std::vector<std::string> words, std::optional<std::vector<std::string>> environment,
-               const fs::path& output) {
+               const fs::path& output, const std::optional<KillAt>& kill = std::nullopt,
+               int logPipe = -1, std::string* log = nullptr,
+               std::vector<double>* lineSeconds = nullptr) {
   // Everything the child needs is made before the fork.
   std::vector<char*> argv, envp;
   for (std::string& word : words) argv.push_back(word.data());
@@ -197,6 +204,16 @@ int runProgram(std::vector<std::string> words, std::optional<std::vector<std::st
     envp.push_back(nullptr);
   }
   const std::string outFile = output.string();
+  // File events are watched from before the start, so none is missed.
+  int fileEvents = -1;
+  std::size_t events = 0;
+  if (kill && kill->folder) {
+    fileEvents = ::inotify_init1(IN_NONBLOCK | IN_CLOEXEC);
+    if (fileEvents < 0 ||
+        ::inotify_add_watch(fileEvents, kill->folder->c_str(), kill->fileEvents) < 0) {
+      ADD_FAILURE() << "cannot watch " << *kill->folder;
+    }
+  }
   const auto start = std::chrono::steady_clock::now();
   const pid_t pid = ::fork();
   if (pid == 0) {
@@ -218,27 +235,95 @@ int runProgram(std::vector<std::string> words, std::optional<std::vector<std::st
     ADD_FAILURE() << "fork failed";
     return -1;
   }
+  using Clock = std::chrono::steady_clock;
+  const auto after = [](double seconds) {
+    return std::chrono::duration_cast<Clock::duration>(std::chrono::duration<double>(seconds));
+  };
+  std::optional<Clock::time_point> killTime;
+  if (kill && !kill->logLine && !kill->folder && kill->seconds) {
+    killTime = start + after(*kill->seconds);
+  }
+  const auto readEvents = [&](Clock::time_point now) {
+    alignas(inotify_event) char buffer[4096];
+    ssize_t got;
+    while ((got = ::read(fileEvents, buffer, sizeof buffer)) > 0) {
+      for (ssize_t at = 0; at < got;) {
+        const auto* event = reinterpret_cast<const inotify_event*>(buffer + at);
+        if ((event->mask & kill->fileEvents) != 0 && ++events == kill->eventCount && !killTime) {
+          killTime = now + after(*kill->seconds);
+        }
+        at += static_cast<ssize_t>(sizeof(inotify_event) + event->len);
+      }
+    }
+  };
+  const auto readLog = [&](Clock::time_point now) {
+    char buffer[65536];
+    ssize_t got;
+    while ((got = ::read(logPipe, buffer, sizeof buffer)) > 0) {
+      log->append(buffer, static_cast<std::size_t>(got));
+      for (ssize_t i = 0; i < got; ++i) {
+        if (buffer[i] != '\n') continue;
+        lineSeconds->push_back(std::chrono::duration<double>(now - start).count());
+        if (!killTime && kill->logLine && kill->seconds && lineSeconds->size() == *kill->logLine) {
+          killTime = now + after(*kill->seconds);
+        }
+      }
+    }
+  };
   int status = 0;
   while (::waitpid(pid, &status, WNOHANG) != pid) {
-    if (std::chrono::steady_clock::now() - start > kRunDeadline) {
+    const auto now = Clock::now();
+    if (logPipe >= 0) readLog(now);
+    if (fileEvents >= 0) readEvents(now);
+    const bool due = killTime && now >= *killTime;
+    if (due || now - start > kRunDeadline) {
       ::kill(pid, SIGKILL);
       ::waitpid(pid, &status, 0);
-      ADD_FAILURE() << words[0] << " did not end in time and was killed";
+      if (!due) ADD_FAILURE() << words[0] << " did not end in time and was killed";
       break;
     }
-    std::this_thread::sleep_for(std::chrono::milliseconds(10));
+    if (logPipe < 0) {
+      std::this_thread::sleep_for(std::chrono::milliseconds(10));
+      continue;
+    }
+    // A run that may be cut short is watched closely: the last millisecond before the kill is
+    // spun through, so the kill lands where it was aimed.
+    pollfd ready[2] = {{logPipe, POLLIN, 0}, {fileEvents, POLLIN, 0}};
+    ::poll(ready, fileEvents >= 0 ? 2 : 1,
+           killTime && *killTime - now < std::chrono::milliseconds(1) ? 0 : 1);
   }
+  if (logPipe >= 0) readLog(Clock::now());
+  if (fileEvents >= 0) ::close(fileEvents);
   return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
 }
 
 }  // namespace
 
 SynctoolRun SynctoolTest::runSynctool(const std::vector<std::string>& arguments) {
+  return runWatched(arguments, std::nullopt);
+}
+
+SynctoolRun SynctoolTest::runSynctool(const std::vector<std::string>& arguments,
+                                      const KillAt& kill) {
+  return runWatched(arguments, kill);
+}
+
+SynctoolRun SynctoolTest::runWatched(const std::vector<std::string>& arguments,
+                                     const std::optional<KillAt>& kill) {
   const fs::path logPath = folder_ / "log.txt";
   const fs::path notesPath = folder_ / "notes.jsonl";
   std::error_code ignored;
   fs::remove(logPath, ignored);
   fs::remove(notesPath, ignored);
+  // A pipe in place of the log file; its read end is open before the tool opens the other
+  // end, so neither waits for the other.
+  int logPipe = -1;
+  if (kill) {
+    if (::mkfifo(logPath.c_str(), 0600) != 0 ||
+        (logPipe = ::open(logPath.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC)) < 0) {
+      ADD_FAILURE() << "cannot make the log pipe " << logPath;
+    }
+  }
 
   std::vector<std::string> words = {ZETOSYNCTOOL_BINARY};
   words.insert(words.end(), arguments.begin(), arguments.end());
@@ -247,16 +332,23 @@ SynctoolRun SynctoolTest::runSynctool(const std::vector<std::string>& arguments)
 
   SynctoolRun run;
   const auto start = std::chrono::steady_clock::now();
-  run.exitStatus = runProgram(std::move(words), std::move(env), folder_ / "stderr.txt");
+  run.exitStatus = runProgram(std::move(words), std::move(env), folder_ / "stderr.txt", kill,
+                              logPipe, &run.log, &run.logLineSeconds);
   run.seconds = std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
-  run.log = readFile(logPath);
+  if (logPipe >= 0) {
+    ::close(logPipe);
+    fs::remove(logPath, ignored);
+  } else {
+    run.log = readFile(logPath);
+  }
   run.logLines = splitLines(run.log);
   run.standardError = readFile(folder_ / "stderr.txt");
   for (const std::string& line : splitLines(readFile(notesPath))) {
     if (line.empty()) continue;
     Json parsed = Json::parse(line, nullptr, false);
     if (parsed.is_discarded()) {
-      ADD_FAILURE() << "not a JSON line in the notification log: " << line;
+      // A killed run may leave its last line half written.
+      if (!kill) ADD_FAILURE() << "not a JSON line in the notification log: " << line;
       continue;
     }
     run.notifications.push_back(std::move(parsed));

@@ -54,6 +54,8 @@ struct SynctoolRun {
   double seconds = 0;   // wall time of the run
   std::string log;      // the whole log file; empty when nothing was logged
   std::vector<std::string> logLines;
+  // When each log line came, in seconds after the start; only for a run watched to be killed.
+  std::vector<double> logLineSeconds;
   std::vector<Json> notifications;  // the notification log, one object per line, in order
   std::string standardError;        // standard output and standard error together
 
@@ -74,6 +76,38 @@ struct SynctoolRun {
 Json expectedNotification(std::string_view sender, std::string_view phase, double percent,
                           std::optional<std::int64_t> status = std::nullopt,
                           std::optional<std::vector<std::string>> dataClasses = std::nullopt);
+
+// Where a run is cut short with SIGKILL: `seconds` after the tool wrote its n-th log line
+// (counting from 1), or after the n-th file event of `fileEvents` (an inotify mask: IN_CREATE,
+// IN_CLOSE_WRITE...) on a file of `folder`, or after the start when neither is given. A
+// watched run (the default) is followed the same way but not killed.
+struct KillAt {
+  static KillAt afterLogLine(std::size_t n, double seconds = 0) {
+    KillAt at;
+    at.logLine = n;
+    at.seconds = seconds;
+    return at;
+  }
+  static KillAt afterFileEvent(fs::path folder, std::uint32_t fileEvents, std::size_t n = 1) {
+    KillAt at;
+    at.folder = std::move(folder);
+    at.fileEvents = fileEvents;
+    at.eventCount = n;
+    at.seconds = 0;
+    return at;
+  }
+  static KillAt afterStart(double seconds) {
+    KillAt at;
+    at.seconds = seconds;
+    return at;
+  }
+
+  std::optional<std::size_t> logLine;
+  std::optional<fs::path> folder;
+  std::uint32_t fileEvents = 0;
+  std::size_t eventCount = 1;
+  std::optional<double> seconds;  // none: never killed
+};
 
 // Each test gets a fresh folder holding the engine's store, a volume folder, a virtual device
 // file with one mounted player (kPlayerID) on that volume, and the tool's defaults file with
@@ -116,6 +150,9 @@ class SynctoolTest : public ::testing::Test {
   // Runs zetosynctool with these arguments (the program name is added) and collects what it
   // left. The log and notification files are emptied first, so each run is seen alone.
   SynctoolRun runSynctool(const std::vector<std::string>& arguments);
+  // The same run, killed at that moment if it is still going; the log then goes through a
+  // pipe, so a line is seen as soon as the tool wrote it.
+  SynctoolRun runSynctool(const std::vector<std::string>& arguments, const KillAt& kill);
   SynctoolRun syncClient(std::string_view clientID) {
     return runSynctool({"--oneshot", "--sync", std::string(clientID)});
   }
@@ -129,6 +166,9 @@ class SynctoolTest : public ::testing::Test {
   TesselRun runTessel(const std::vector<std::string>& arguments);
 
  private:
+  SynctoolRun runWatched(const std::vector<std::string>& arguments,
+                         const std::optional<KillAt>& kill);
+
   fs::path folder_;
   std::unique_ptr<tessel::Store> store_;
   bool useSessionBus_ = false;
