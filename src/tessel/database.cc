@@ -6,16 +6,23 @@
 #include <vector>
 
 #include "tessel/exception.h"
+#include "tessel/record_links.h"
 
 namespace tessel::detail {
 
 namespace {
 
+// One step of the schema: its SQL, then what SQL alone cannot fill (records are encoded).
+struct Migration {
+  const char* sql;
+  void (*fill)(Connection&) = nullptr;
+};
+
 // Each step brings the schema from version i to i + 1. Steps are never edited once shipped:
 // a change of the schema is a new step.
-const std::vector<const char*>& migrations() {
-  static const std::vector<const char*> steps = {
-      R"sql(
+const std::vector<Migration>& migrations() {
+  static const std::vector<Migration> steps = {
+      {R"sql(
 CREATE TABLE store_state(
   id INTEGER PRIMARY KEY CHECK (id = 1),
   generation INTEGER NOT NULL);
@@ -70,7 +77,18 @@ CREATE TABLE sessions(
   ended_at INTEGER,
   outcome INTEGER NOT NULL,
   cancel_requested INTEGER NOT NULL DEFAULT 0) WITHOUT ROWID;
+)sql"},
+      // Who names whom, so that deleting a record can take it out of the relationships that
+      // name it without reading the whole truth (record_links.h). Targets are identifier
+      // hashes, sources record keys.
+      {R"sql(
+CREATE TABLE record_links(
+  target INTEGER NOT NULL,
+  source INTEGER NOT NULL,
+  PRIMARY KEY (target, source)) WITHOUT ROWID;
+CREATE INDEX record_links_by_source ON record_links(source);
 )sql",
+       indexEveryRecord},
   };
   return steps;
 }
@@ -126,7 +144,10 @@ void Database::migrate() {
                                               "(schema " +
                                               std::to_string(version) + ")");
   }
-  for (int step = version; step < latest; ++step) writer_->execute(steps[step]);
+  for (int step = version; step < latest; ++step) {
+    writer_->execute(steps[step].sql);
+    if (steps[step].fill) steps[step].fill(*writer_);
+  }
   writer_->execute("DELETE FROM schema_version");
   writer_->cached("INSERT INTO schema_version(version) VALUES (?)").bind(1, latest).run();
   transaction.commit();

@@ -7,6 +7,7 @@
 #include "tessel/exception.h"
 #include "tessel/process_identity.h"
 #include "tessel/read_view.h"
+#include "tessel/record_links.h"
 #include "tessel/schema.h"
 #include "tessel/session_outcome_codes.h"
 #include "tessel/value_codec.h"
@@ -67,19 +68,24 @@ std::size_t writeRecords(detail::Connection& writer, const std::vector<Record>& 
       "ON CONFLICT(id) DO UPDATE SET entity = excluded.entity, generation = excluded.generation, "
       "deleted = 0, data = excluded.data "
       "WHERE records.deleted <> 0 OR records.entity <> excluded.entity "
-      "OR records.data IS NOT excluded.data");
+      "OR records.data IS NOT excluded.data RETURNING key");
   std::size_t written = 0;
   std::vector<std::uint8_t> bytes;
   for (std::size_t i = 0; i < records.size(); ++i) {
     bytes.clear();
     detail::ValueWriter(bytes).record(records[i].record);
-    upsert.bind(1, records[i].id)
-        .bind(2, entities[i])
-        .bind(3, generation.next())
-        .bindBlob(4, bytes);
-    upsert.run();
-    if (writer.changes() > 0) {
+    std::optional<std::int64_t> key;  // none when the stored record was left as it was
+    {
+      detail::StatementReset reset(upsert);
+      upsert.bind(1, records[i].id)
+          .bind(2, entities[i])
+          .bind(3, generation.next())
+          .bindBlob(4, bytes);
+      if (upsert.step()) key = upsert.integer(0);
+    }
+    if (key) {
       ++written;
+      detail::indexLinks(writer, *key, detail::namedIdentifiers(entities[i], records[i].record));
     } else {
       generation.undo();
     }
@@ -177,16 +183,27 @@ std::size_t Store::deleteRecords(const std::vector<std::string>& identifiers,
 
 namespace {
 
+// Deletes, then takes the deleted identifiers out of every relationship that names them, so
+// that no record points at nothing: an event whose organizer is gone would otherwise fail its
+// calendar's export on every sync. Those records are written with new generations, so
+// clients see them modified, in the same transaction as the deletes.
 std::size_t tombstoneRecords(detail::Connection& writer,
                              const std::vector<std::string>& identifiers, MissingRecords missing) {
   GenerationCounter generation(writer);
   auto& tombstone = writer.cached(
-      "UPDATE records SET deleted = 1, data = NULL, generation = ? WHERE id = ? AND deleted = 0");
-  std::size_t deleted = 0;
+      "UPDATE records SET deleted = 1, data = NULL, generation = ? WHERE id = ? AND deleted = 0 "
+      "RETURNING key");
+  std::vector<std::string> deleted;
   for (const std::string& identifier : identifiers) {
-    tombstone.bind(1, generation.next()).bind(2, identifier).run();
-    if (writer.changes() > 0) {
-      ++deleted;
+    std::optional<std::int64_t> key;
+    {
+      detail::StatementReset reset(tombstone);
+      tombstone.bind(1, generation.next()).bind(2, identifier);
+      if (tombstone.step()) key = tombstone.integer(0);
+    }
+    if (key) {
+      deleted.push_back(identifier);
+      detail::indexLinks(writer, *key, {});  // a deleted record names no one
       continue;
     }
     generation.undo();
@@ -195,7 +212,12 @@ std::size_t tombstoneRecords(detail::Connection& writer,
     }
   }
   generation.save();
-  return deleted;
+  if (!deleted.empty()) {
+    std::vector<std::string> entities;
+    std::vector<Record> unlinked = detail::recordsWithoutLinksTo(writer, deleted, entities);
+    writeRecords(writer, unlinked, entities);
+  }
+  return deleted.size();
 }
 
 }  // namespace

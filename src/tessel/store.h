@@ -24,7 +24,8 @@ class Database;
 enum class StoreOpening { CreateIfMissing, MustExist };
 
 // Writes that belong together, applied by Store::applyChanges in one transaction: records put,
-// then records deleted (unknown identifiers are ignored), then the calendar order replaced.
+// then records deleted (unknown identifiers are ignored; the others leave the relationships
+// that name them), then the calendar order replaced.
 struct StoreChanges {
   std::vector<Record> put;
   std::vector<std::string> remove;
@@ -62,8 +63,10 @@ class Store {
   // (TesselInvalidRecordException otherwise). Records equal to the stored ones are left as
   // they are; the others are inserted or replaced. Answers how many were written.
   std::size_t putRecords(const std::vector<Record>& records);
-  // Leaves tombstones; answers how many were deleted. With MissingRecords::Fail an unknown
-  // identifier raises TesselUnknownRecordException and nothing is deleted.
+  // Leaves tombstones and takes the deleted identifiers out of every relationship that names
+  // them (those records get new generations); answers how many were deleted. With
+  // MissingRecords::Fail an unknown identifier raises TesselUnknownRecordException and nothing
+  // is deleted.
   std::size_t deleteRecords(const std::vector<std::string>& identifiers,
                             MissingRecords missing = MissingRecords::Ignore);
   std::optional<zt::platform::Dictionary> record(std::string_view identifier) const;

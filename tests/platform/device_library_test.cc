@@ -223,9 +223,14 @@ TEST_F(DeviceLibraryTest, LockIsExclusiveAcrossProcessesUntilReleased) {
   VirtualDeviceLibrary library(file);
   std::vector<ZetoRef> devices;
   ASSERT_EQ(library.ZetoCopyConnected(devices), kZetoSuccess);
+  // The other process runs for another user's session: its own runtime folder and home, and
+  // it names the device file through a link.
+  fs::create_symlink(dir_, dir_ / "link");
   auto childTakesLock = [&] {
     return inChild([&] {
-      VirtualDeviceLibrary other(file);
+      setenv("XDG_RUNTIME_DIR", (dir_ / "volume").c_str(), 1);
+      setenv("HOME", (dir_ / "volume").c_str(), 1);
+      VirtualDeviceLibrary other((dir_ / "link/devices.json").string());
       std::vector<ZetoRef> theirs;
       if (other.ZetoCopyConnected(theirs) != kZetoSuccess) return 2;
       std::int32_t result = other.ZetoAquireLock(theirs[0]);
@@ -239,8 +244,10 @@ TEST_F(DeviceLibraryTest, LockIsExclusiveAcrossProcessesUntilReleased) {
   // Not re-entrant, and other players' locks are separate.
   EXPECT_EQ(library.ZetoAquireLock(devices[0]), kZetoErrorLockBusy);
   EXPECT_EQ(library.ZetoAquireLock(devices[1]), kZetoSuccess);
-  EXPECT_TRUE(fs::exists(dir_ / "runtime/zeto/A27001A2B3C4D.lock"));
-  EXPECT_EQ(fs::status(dir_ / "runtime/zeto").permissions() & fs::perms::all, fs::perms::owner_all);
+  // Beside the device file, readable by every user's syncs.
+  EXPECT_EQ(fs::status(dir_ / "zeto-A27001A2B3C4D.lock").permissions() & fs::perms::all,
+            fs::perms::owner_read | fs::perms::owner_write | fs::perms::group_read |
+                fs::perms::others_read);
 
   EXPECT_EQ(library.ZetoReleaseLock(devices[0]), kZetoSuccess);
   EXPECT_EQ(childTakesLock(), 0);
@@ -248,28 +255,52 @@ TEST_F(DeviceLibraryTest, LockIsExclusiveAcrossProcessesUntilReleased) {
   EXPECT_EQ(library.ZetoReleaseLock(devices[2]), kZetoErrorNotLocked);
 }
 
-TEST_F(DeviceLibraryTest, LockIsSharedByIdentifierAndDiesWithItsHolder) {
+TEST_F(DeviceLibraryTest, LockDiesWithItsHolder) {
   VirtualDeviceLibrary library(threePlayers());
   std::vector<ZetoRef> devices;
   ASSERT_EQ(library.ZetoCopyConnected(devices), kZetoSuccess);
-  ASSERT_EQ(library.ZetoAquireLock(devices[1]), kZetoSuccess);
-  // The linux backend locks by the same identifier text.
-  EXPECT_EQ(inChild([] { return DeviceLocks().acquire(0x1A2B) == kZetoErrorLockBusy ? 0 : 1; }), 0);
-  EXPECT_EQ(inChild([] { return DeviceLocks().acquire(0x1A2C) == kZetoSuccess ? 0 : 1; }), 0);
-  // A holder that ends without releasing leaves the player free.
-  EXPECT_EQ(inChild([] {
-              auto* leaked = new DeviceLocks();  // never destroyed: the process just ends
+  EXPECT_EQ(inChild([&] {
+              auto* leaked = new DeviceLocks(dir_.string());  // never destroyed: the process ends
               return leaked->acquire(0xA27001A2B3C4DULL) == kZetoSuccess ? 0 : 1;
             }),
             0);
   EXPECT_EQ(library.ZetoAquireLock(devices[0]), kZetoSuccess);
 }
 
-TEST_F(DeviceLibraryTest, LockFallsBackToRunLockWithoutRuntimeFolder) {
+TEST_F(DeviceLibraryTest, RealPlayersLockInTheMachineFolderWhateverTheEnvironment) {
   unsetenv("XDG_RUNTIME_DIR");
-  EXPECT_EQ(DeviceLocks::lockPathFor(0x1A2B), "/run/lock/zeto-1A2B.lock");
+  const std::string folder = DeviceLocks::machineFolder();
+  EXPECT_EQ(folder, fs::is_directory("/run/lock") ? "/run/lock" : folder);
+  EXPECT_EQ(DeviceLocks(folder).lockPathFor(0x1A2B), folder + "/zeto-1A2B.lock");
   setenv("XDG_RUNTIME_DIR", (dir_ / "runtime").c_str(), 1);
-  EXPECT_EQ(DeviceLocks::lockPathFor(0xABC), (dir_ / "runtime/zeto/ABC.lock").string());
+  EXPECT_EQ(DeviceLocks::machineFolder(), folder);
+}
+
+TEST_F(DeviceLibraryTest, LockRefusesWhatOthersPlantedInASharedFolder) {
+  // A world-writable sticky folder like /run/lock.
+  const fs::path shared = dir_ / "shared";
+  fs::create_directory(shared);
+  fs::permissions(shared, fs::perms::all | fs::perms::sticky_bit);
+  DeviceLocks locks(shared.string());
+
+  fs::create_symlink(dir_ / "victim", shared / "zeto-1.lock");
+  fs::create_directory(shared / "zeto-2.lock");
+  ASSERT_EQ(mkfifo((shared / "zeto-3.lock").c_str(), 0666), 0);
+  EXPECT_EQ(locks.acquire(1), kZetoErrorFailed);
+  EXPECT_FALSE(fs::exists(dir_ / "victim"));
+  EXPECT_EQ(locks.acquire(2), kZetoErrorFailed);
+  EXPECT_EQ(locks.acquire(3), kZetoErrorFailed);  // and does not hang on the FIFO
+
+  // Another user's lock file, read-only to us, still locks.
+  const fs::path theirs = shared / "zeto-4.lock";
+  std::ofstream(theirs).put('\0');
+  fs::permissions(theirs, fs::perms::owner_read | fs::perms::group_read | fs::perms::others_read);
+  if (geteuid() == 0) {
+    ASSERT_EQ(chown(theirs.c_str(), 65534, 65534), 0);
+  }
+  EXPECT_EQ(locks.acquire(4), kZetoSuccess);
+  EXPECT_EQ(inChild([&] { return DeviceLocks(shared.string()).acquire(4) == kZetoErrorLockBusy; }),
+            1);
 }
 
 TEST_F(DeviceLibraryTest, FactoryChoosesVirtualWhenTheDeviceFileIsNamed) {

@@ -12,6 +12,7 @@
 
 #include "platform/utf16.h"
 #include "sync/synctool_fixture.h"
+#include "tessel/schema.h"
 
 namespace zt::sync::test_support {
 namespace {
@@ -104,6 +105,26 @@ TEST_F(ImportAndSync, ExportedAddressBooksAndCalendarsLandIntactAndSyncOnceOnly)
   SynctoolRun second = syncClient(kClientID);
   ASSERT_EQ(second.finalStatus(), 0) << second.log;
   EXPECT_TRUE(second.logContains("Nothing to push for contacts"));
+}
+
+TEST_F(ImportAndSync, DeletingAnOrganizerLeavesItsCalendarWhole) {
+  ASSERT_EQ(
+      runTessel({"import", "ical", (kSamples / "calendars" / "work.ics").string()}).exitStatus, 0);
+  ASSERT_EQ(runTessel({"client", "register", std::string(kClientID), "--calendars"}).exitStatus, 0);
+  ASSERT_EQ(syncClient(kClientID).finalStatus(), 0);
+
+  std::vector<std::string> deleteCommand{"records", "delete"};
+  store().forEachRecord([&](const tessel::Record& r) { deleteCommand.push_back(r.id); },
+                        tessel::TesselEntity_Calendars_Organizer);
+  ASSERT_EQ(deleteCommand.size(), 4u);  // both organizers
+  ASSERT_EQ(runTessel(deleteCommand).exitStatus, 0);
+
+  SynctoolRun run = syncClient(kClientID);
+  ASSERT_EQ(run.finalStatus(), 0) << run.log;
+  const std::string work = readFile(volume() / "Calendars" / "Tessel-Work.ics");
+  EXPECT_HAS(work, "SUMMARY:Team stand-up\r\n");
+  EXPECT_HAS(work, "SUMMARY:Quarterly review with the board");
+  EXPECT_EQ(work.find("ORGANIZER"), std::string::npos);
 }
 
 }  // namespace

@@ -196,6 +196,23 @@ TEST_F(PlayerLock, APlayerLockedByAnotherProcessIsNotSynced) {
   EXPECT_EQ(next.result(), platform::kZetoSuccess);
 }
 
+TEST_F(PlayerLock, AnotherUsersSyncHoldsTheSameLock) {
+  // A sync started by cron, a systemd unit or another login has a runtime folder and home of
+  // its own, and still must not write to the player at the same time.
+  registerClient(kClientID, false, false);
+  fs::create_directories(folder() / "other/run");
+  auto otherSession = environment();
+  otherSession["HOME"] = (folder() / "other").string();
+  otherSession["XDG_RUNTIME_DIR"] = (folder() / "other/run").string();
+  LockHolder holder(otherSession, kPlayerNumber);
+  ASSERT_EQ(holder.result(), platform::kZetoSuccess);
+
+  const SynctoolRun run = syncClient(kClientID);
+  EXPECT_TRUE(run.logged("Can't get a lock on Zeto")) << run.log;
+  EXPECT_EQ(run.finalStatus(), 3);
+  EXPECT_FALSE(fs::exists(volume() / "Contacts"));
+}
+
 using PlayerMatching = SynctoolTest;
 
 TEST_F(PlayerMatching, TheClientIdentifierMustEndWithTheUpperCaseHexIdentifier) {

@@ -166,6 +166,105 @@ TEST_F(StoreRecords, ChangesAppliedTogetherLandTogetherOrNotAtAll) {
   EXPECT_EQ(store_->recordCount(TesselEntity_Calendars_CalendarOrder), 1u);
 }
 
+using StoreRelationships = StoreTest;
+
+Record entity(std::string id, std::string_view entityName) {
+  return Record{std::move(id), Dictionary{{std::string(TesselRecordEntityNameKey), entityName}}};
+}
+
+Record event(std::string id, std::string organizer, Array attendees) {
+  return Record{
+      std::move(id),
+      Dictionary{{std::string(TesselRecordEntityNameKey), TesselEntity_Calendars_Event},
+                 {std::string(TesselAttribute_Calendars_Event_Summary), "Review"},
+                 {std::string(TesselRelationship_Calendars_Event_Organizer), Array{organizer}},
+                 {std::string(TesselRelationship_Calendars_Event_Attendees), attendees},
+                 {std::string(TesselRelationship_Calendars_Event_Calendar), Array{"k1"}}}};
+}
+
+Record members(std::string id, Array identifiers) {
+  Record record = group(std::move(id), "Friends");
+  record.record.set(TesselRelationship_Contacts_Group_Members, Value(std::move(identifiers)));
+  return record;
+}
+
+// The generation the store file holds for one record, read beside the store.
+std::int64_t generationOf(const std::filesystem::path& store, const std::string& id) {
+  sqlite3* db = nullptr;
+  EXPECT_EQ(sqlite3_open(store.c_str(), &db), SQLITE_OK);
+  sqlite3_stmt* query = nullptr;
+  sqlite3_prepare_v2(db, "SELECT generation FROM records WHERE id = ?", -1, &query, nullptr);
+  sqlite3_bind_text(query, 1, id.c_str(), -1, SQLITE_TRANSIENT);
+  std::int64_t generation = sqlite3_step(query) == SQLITE_ROW ? sqlite3_column_int64(query, 0) : -1;
+  sqlite3_finalize(query);
+  sqlite3_close(db);
+  return generation;
+}
+
+TEST_F(StoreRelationships, ADeletedRecordLeavesEveryRelationshipThatNamedIt) {
+  store_->putRecords({calendar("k1"), entity("o1", TesselEntity_Calendars_Organizer),
+                      entity("a1", TesselEntity_Calendars_Attendee),
+                      entity("a2", TesselEntity_Calendars_Attendee),
+                      event("e1", "o1", {"a1", "a2"}), event("e2", "o1", {"a2"}),
+                      event("untouched", "o2", {"a1"})});
+  const std::int64_t before = generationOf(storePath_, "untouched");
+
+  EXPECT_EQ(store_->deleteRecords({"o1", "a2"}), 2u);
+
+  // Each naming record is written once, after the deletes; an emptied relationship goes, as
+  // an importer leaves it out; the others stay in their order.
+  const std::int64_t deletedAt = generationOf(storePath_, "a2");
+  EXPECT_GT(generationOf(storePath_, "e1"), deletedAt);
+  EXPECT_GT(generationOf(storePath_, "e2"), deletedAt);
+  EXPECT_EQ(store_->generation(), deletedAt + 2);
+  EXPECT_EQ(generationOf(storePath_, "untouched"), before);
+  Dictionary expected = event("e1", "o1", {"a1"}).record;
+  expected.erase(TesselRelationship_Calendars_Event_Organizer);
+  EXPECT_EQ(*store_->record("e1"), expected);
+  EXPECT_FALSE(store_->record("e2")->contains(TesselRelationship_Calendars_Event_Attendees));
+
+  // A record put again names what it names: the index follows rewrites too.
+  store_->putRecords({entity("o1", TesselEntity_Calendars_Organizer), event("e1", "o1", {})});
+  store_->deleteRecords({"k1"});
+  EXPECT_FALSE(store_->record("e1")->contains(TesselRelationship_Calendars_Event_Calendar));
+  EXPECT_TRUE(store_->record("e1")->contains(TesselRelationship_Calendars_Event_Organizer));
+}
+
+TEST_F(StoreRelationships, GroupsLoseDeletedMembersAndImportsDropThemInTheSameTransaction) {
+  store_->putRecords({contact("c1", "Ann", {"g1"}), contact("c2", "Bob", {"g1"}),
+                      contact("c3", "Cy"), members("g1", {"c1", "c2", "c3"}),
+                      members("g2", {"g1", "c3"})});
+
+  // What an import with --sync-deletes writes: the contacts it no longer saw, and a group.
+  store_->applyChanges({{members("g3", {"c2", "c3"})}, {"c1", "c2", "g1"}, std::nullopt});
+  EXPECT_EQ(*store_->record("g2"), members("g2", {"c3"}).record);
+  EXPECT_EQ(*store_->record("g3"), members("g3", {"c3"}).record);
+  // Values that merely look like identifiers are not relationships.
+  store_->putRecords(
+      {{"n1", Dictionary{{std::string(TesselRecordEntityNameKey), TesselEntity_Contacts_Contact},
+                         {std::string(TesselAttribute_Contacts_Contact_Notes), "c3"}}}});
+  store_->deleteRecords({"c3"});
+  EXPECT_EQ(*store_->record("n1")->find(TesselAttribute_Contacts_Contact_Notes), Value("c3"));
+  EXPECT_FALSE(store_->record("g2")->contains(TesselRelationship_Contacts_Group_Members));
+}
+
+TEST_F(StoreRelationships, AStoreFromBeforeTheIndexIsIndexedWhenOpened) {
+  store_->putRecords(
+      {entity("o1", TesselEntity_Calendars_Organizer), calendar("k1"), event("e1", "o1", {})});
+  store_.reset();
+  sqlite3* db = nullptr;
+  ASSERT_EQ(sqlite3_open(storePath_.c_str(), &db), SQLITE_OK);
+  ASSERT_EQ(sqlite3_exec(db, "DROP TABLE record_links; UPDATE schema_version SET version = 1",
+                         nullptr, nullptr, nullptr),
+            SQLITE_OK);
+  sqlite3_close(db);
+
+  store_ = Store::open(storePath_, StoreOpening::MustExist);
+  EXPECT_EQ(store_->schemaVersion(), 2);
+  store_->deleteRecords({"o1"});
+  EXPECT_FALSE(store_->record("e1")->contains(TesselRelationship_Calendars_Event_Organizer));
+}
+
 using StoreClients = StoreTest;
 
 TEST_F(StoreClients, SettingsKeepTheirTypeAndSurviveAReopen) {
@@ -233,7 +332,7 @@ TEST_F(StoreFile, PathRulesFollowOptionThenEnvironment) {
 }
 
 TEST_F(StoreFile, IsWalWithAVersionedSchemaAndRefusesWhatIsNotAStore) {
-  EXPECT_EQ(store_->schemaVersion(), 1);
+  EXPECT_EQ(store_->schemaVersion(), 2);
   EXPECT_TRUE(std::filesystem::exists(storePath_.string() + "-wal"));
 
   EXPECT_THROW(Store::open(folder_ / "absent.db", StoreOpening::MustExist), Exception);

@@ -71,7 +71,7 @@ class LinuxDeviceLibrary final : public DeviceLibrary {
   void onMountTableChange();
   void deliver(std::uint64_t uniqueId, ZetoEvent event);
 
-  DeviceLocks locks_;
+  DeviceLocks locks_{DeviceLocks::machineFolder()};
 
   RunLoop* loop_ = nullptr;
   std::string mode_;

@@ -8,14 +8,32 @@
 #include <cerrno>
 #include <chrono>
 #include <cstring>
+#include <filesystem>
+#include <system_error>
 #include <utility>
 
 #include "platform/log.h"
 
 namespace zt::platform {
 
+namespace {
+
+// The virtual players' locks live beside their device file, so that every process that sees
+// the same players shares their locks, whatever its environment, while tests with device files
+// of their own never contend for the same identifiers. The link-free path makes processes that
+// name the file differently agree.
+std::string lockFolderOf(const std::string& deviceFile) {
+  std::error_code error;
+  std::filesystem::path path = std::filesystem::weakly_canonical(deviceFile, error);
+  if (error) path = std::filesystem::absolute(deviceFile, error);
+  std::filesystem::path folder = path.parent_path();
+  return folder.empty() ? std::string(".") : folder.string();
+}
+
+}  // namespace
+
 VirtualDeviceLibrary::VirtualDeviceLibrary(std::string deviceFile)
-    : deviceFile_(std::move(deviceFile)) {}
+    : deviceFile_(std::move(deviceFile)), locks_(lockFolderOf(deviceFile_)) {}
 
 VirtualDeviceLibrary::~VirtualDeviceLibrary() {
   ZetoUnregisterFromServer();

@@ -15,7 +15,8 @@ namespace zt::platform {
 
 // The device library over simulated players described by a device file (virtual_players.h),
 // so that the whole tool runs without hardware. The file is read at the first operation
-// that needs it; the locks are the real ones, shared with other processes.
+// that needs it; the locks are the real ones, files beside the device file shared by every
+// process that reads it.
 class VirtualDeviceLibrary final : public DeviceLibrary {
  public:
   explicit VirtualDeviceLibrary(std::string deviceFile);

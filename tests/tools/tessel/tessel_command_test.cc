@@ -109,7 +109,11 @@ TEST_F(TesselCommand, DeleteIsAllOrNothing) {
 
   const Outcome run = tessel({"records", "delete", "ev-1", "p-1"});
   ASSERT_EQ(run.status, 0) << run.err;
-  EXPECT_EQ(listJson(), kCalendar + "\n");
+  // The calendar no longer names the deleted event.
+  EXPECT_EQ(
+      listJson(),
+      R"({"id":"cal-1","record":{"tessel.record.entity":"tessel.calendars.Calendar","title":"Work"}})"
+      "\n");
 }
 
 TEST_F(TesselCommand, CalendarOrderIsTheOneOrderRecord) {
