@@ -37,7 +37,9 @@ class ImageService {
   virtual ~ImageService() = default;
 
   // Reads the picture's header. The bytes must outlive the image and every image made from
-  // it. None when the bytes are no picture the service knows.
+  // it. None when the bytes are no photo format the service reads (JPEG, HEIF/AVIF, WebP, PNG,
+  // GIF, TIFF; never documents such as SVG or PDF), or when the header claims a picture larger
+  // than its format's budget of pixels, so that no picture costs more than a bounded decode.
   virtual std::unique_ptr<Image> decode(std::span<const std::uint8_t> bytes) = 0;
   // The image scaled by `factor` on both axes; its extent is the scaled extent rounded to
   // whole pixels. None when the image cannot be scaled.

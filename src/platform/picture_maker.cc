@@ -78,7 +78,10 @@ std::optional<Data> makePicture(const PictureRecipe& recipe) {
         return false;
       }
     }
-    if (recipe.format == PictureFormat::PNG && recipe.alpha == PictureAlpha::HalfTransparent &&
+    const bool alphaFormat = recipe.format == PictureFormat::PNG ||
+                             recipe.format == PictureFormat::WebP ||
+                             recipe.format == PictureFormat::TIFF;
+    if (alphaFormat && recipe.alpha == PictureAlpha::HalfTransparent &&
         !step(image, [](VipsImage* in, VipsImage** out) {
           return vips_bandjoin_const1(in, out, 128.0, nullptr);
         })) {
@@ -96,10 +99,23 @@ std::optional<Data> makePicture(const PictureRecipe& recipe) {
 
   void* buffer = nullptr;
   std::size_t length = 0;
-  const int failed = recipe.format == PictureFormat::JPEG
-                         ? vips_jpegsave_buffer(image.get(), &buffer, &length, "Q",
-                                                recipe.jpegQuality, "strip", TRUE, nullptr)
-                         : vips_pngsave_buffer(image.get(), &buffer, &length, nullptr);
+  const int failed = [&] {
+    switch (recipe.format) {
+      case PictureFormat::JPEG:
+        return vips_jpegsave_buffer(image.get(), &buffer, &length, "Q", recipe.jpegQuality, "strip",
+                                    TRUE, nullptr);
+      case PictureFormat::PNG:
+        return vips_pngsave_buffer(image.get(), &buffer, &length, nullptr);
+      case PictureFormat::GIF:
+        return vips_gifsave_buffer(image.get(), &buffer, &length, nullptr);
+      case PictureFormat::WebP:
+        return vips_webpsave_buffer(image.get(), &buffer, &length, "lossless", TRUE, "strip", TRUE,
+                                    nullptr);
+      case PictureFormat::TIFF:
+        return vips_tiffsave_buffer(image.get(), &buffer, &length, nullptr);
+    }
+    return -1;
+  }();
   if (failed != 0) {
     vips_error_clear();
     return std::nullopt;

@@ -7,7 +7,8 @@
 
 namespace zt::platform {
 
-enum class PictureFormat { JPEG, PNG };
+// WebP is written lossless, TIFF uncompressed.
+enum class PictureFormat { JPEG, PNG, GIF, WebP, TIFF };
 // Flat pictures compress to almost nothing; noisy ones are as large as photographs get.
 enum class PicturePattern { Flat, Gradient, Noise };
 enum class PictureAlpha { None, HalfTransparent };
@@ -16,7 +17,7 @@ struct PictureRecipe {
   PixelSize size;
   PictureFormat format = PictureFormat::JPEG;
   PicturePattern pattern = PicturePattern::Gradient;
-  PictureAlpha alpha = PictureAlpha::None;  // PNG only
+  PictureAlpha alpha = PictureAlpha::None;  // PNG, WebP and TIFF only
   int jpegQuality = 75;
 };
 
