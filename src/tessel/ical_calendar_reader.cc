@@ -12,8 +12,8 @@
 #include "platform/calendar_date.h"
 #include "platform/value.h"
 #include "tessel/ical_document.h"
-#include "tessel/import_error.h"
 #include "tessel/ical_time_zones.h"
+#include "tessel/import_error.h"
 #include "tessel/schema.h"
 
 namespace tessel {

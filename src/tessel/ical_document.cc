@@ -195,7 +195,7 @@ std::optional<std::size_t> ICalDocument::lineOf(icalcomponent* component) {
 }
 
 ImportError ICalDocument::errorAt(icalproperty* property, icalcomponent* component,
-                                std::string reason) const {
+                                  std::string reason) const {
   std::optional<std::size_t> line = lineOf(property);
   if (!line) line = lineOf(component);
   return ImportError(source_, line, std::move(reason));

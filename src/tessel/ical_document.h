@@ -40,7 +40,7 @@ class ICalDocument {
   // An ImportError about this file at the line of `property` (or of `component` when the
   // property is null).
   ImportError errorAt(icalproperty_impl* property, icalcomponent_impl* component,
-                    std::string reason) const;
+                      std::string reason) const;
 
  private:
   ICalDocument(icalcomponent_impl* root, std::string source)

@@ -32,7 +32,8 @@ std::string lowerCased(std::string text) {
 
 std::string readText(const fs::path& path, const std::string& name) {
   std::ifstream in(path, std::ios::binary);
-  if (!in) throw ImportError(name, std::nullopt, std::string("cannot read: ") + std::strerror(errno));
+  if (!in)
+    throw ImportError(name, std::nullopt, std::string("cannot read: ") + std::strerror(errno));
   std::ostringstream text;
   text << in.rdbuf();
   if (in.bad()) throw ImportError(name, std::nullopt, "cannot read");

@@ -5,9 +5,9 @@
 #include <stdexcept>
 #include <utility>
 
+#include "tessel/import_error.h"
 #include "tessel/schema.h"
 #include "tessel/vcard_decoding.h"
-#include "tessel/import_error.h"
 #include "tessel/vcard_identifiers.h"
 
 namespace tessel::vcard {

@@ -10,9 +10,9 @@
 #include <unordered_set>
 #include <utility>
 
+#include "tessel/import_error.h"
 #include "tessel/schema.h"
 #include "tessel/vcard_decoding.h"
-#include "tessel/import_error.h"
 #include "tessel/vcard_identifiers.h"
 #include "tessel/vcard_reader.h"
 
@@ -34,7 +34,7 @@ std::string readFile(const fs::path& file) {
   std::ifstream in(file, std::ios::binary);
   if (!in) {
     throw ImportError(file.string(), std::nullopt,
-                     std::string("cannot read: ") + std::strerror(errno));
+                      std::string("cannot read: ") + std::strerror(errno));
   }
   std::ostringstream text;
   text << in.rdbuf();
