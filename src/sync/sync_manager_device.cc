@@ -17,8 +17,6 @@ using platform::Log;
 namespace {
 
 constexpr std::string_view kZetoMode = "ZetoMode";
-// The system mounts the player by itself; the tool only waits this long for it.
-constexpr double kMountWaitSeconds = 20.0;
 
 }  // namespace
 
@@ -82,15 +80,17 @@ bool ZTSyncManager::mountZeto() {
   std::int32_t result = devices.ZetoCopyMountpoint(*_zetoRef, path);
   if (result == kStatusVolumeNotMounted) {
     Log::debug("Needing to mount Zeto");
+    // The system mounts the player by itself; the tool only waits this long for it.
+    const double waitSeconds = services_.mountWaitSeconds;
     auto start = std::chrono::steady_clock::now();
     while (!zetoIsMounted()) {
       double elapsed =
           std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
-      if (elapsed > kMountWaitSeconds) {
+      if (elapsed > waitSeconds) {
         Log::debug("Time outing mounting Zeto");
         break;
       }
-      services_.runLoop.runInMode(kZetoMode, kMountWaitSeconds - elapsed,
+      services_.runLoop.runInMode(kZetoMode, waitSeconds - elapsed,
                                   platform::RunLoop::ReturnAfter::SourceHandled);
     }
     if (!zetoIsMounted()) {

@@ -27,6 +27,9 @@ struct SyncServices {
   // Whether the player mounted at the volume path takes contact pictures; answers false
   // when it cannot tell. None: no player is ever asked.
   std::function<bool(const std::string& volumePath)> deviceSupportsContactPictures;
+  // How long to wait for the player's volume to mount before giving up. The program keeps
+  // this; tests shorten it.
+  double mountWaitSeconds = 20.0;
 };
 
 }  // namespace zt::sync

@@ -59,21 +59,7 @@ TEST_F(PlayerVolume, EventsOfAnotherPlayerDoNotEndTheWait) {
   EXPECT_FALSE(fs::exists(other / "Contacts"));
 }
 
-TEST_F(PlayerVolume, AVolumeThatNeverMountsIsGivenUpAfterTwentySeconds) {
-  registerClient(kClientID, false, false);
-  setPlayers({Player::neverMounting(std::string(kPlayerID))});
-  const SynctoolRun run = syncClient(kClientID);
-  EXPECT_EQ(run.exitStatus, 0);
-  EXPECT_TRUE(run.logged("Needing to mount Zeto")) << run.log;
-  EXPECT_TRUE(run.logged("Time outing mounting Zeto")) << run.log;
-  EXPECT_GE(run.seconds, 20.0);
-  ASSERT_EQ(run.notifications.size(), 2u);
-  EXPECT_EQ(run.finalStatus(), 3);
-  EXPECT_FALSE(client(kClientID)->lastSession().has_value());
-  EXPECT_FALSE(fs::exists(volume() / "Contacts"));
-  // The lock taken before the wait is given back.
-  EXPECT_TRUE(run.logged("Unlocking Zeto"));
-}
+// Giving up on a volume that never mounts: sync_manager_test, in process.
 
 TEST_F(PlayerVolume, ARegularFileNamedContactsTurnsContactsOffButNotTheRun) {
   registerClient(kClientID, true, true);
