@@ -12,7 +12,9 @@
 #include "importers/ical_document.h"
 #include "importers/ical_time_zones.h"
 #include "importers/import_error.h"
+#include "platform/ascii.h"
 #include "platform/calendar_date.h"
+#include "platform/calendar_day.h"
 #include "platform/value.h"
 #include "tessel/schema.h"
 
@@ -23,6 +25,7 @@ namespace {
 using zt::platform::Array;
 using zt::platform::CalendarDate;
 using zt::platform::Dictionary;
+using zt::platform::lowerAscii;
 using zt::platform::TimeZone;
 using zt::platform::Value;
 
@@ -32,14 +35,6 @@ constexpr std::int64_t kLongestDuration = std::int64_t{1000} * 366 * 86400;
 struct FreeText {
   void operator()(char* text) const { std::free(text); }
 };
-
-std::string lowerCased(std::string_view text) {
-  std::string lower(text);
-  for (char& c : lower) {
-    if (c >= 'A' && c <= 'Z') c = static_cast<char>(c - 'A' + 'a');
-  }
-  return lower;
-}
 
 std::vector<icalproperty*> propertiesOf(icalcomponent* component) {
   std::vector<icalproperty*> properties;
@@ -80,15 +75,6 @@ std::string valueText(icalproperty* property) {
 std::optional<std::string> text(const char* value) {
   if (value == nullptr || *value == '\0') return std::nullopt;
   return std::string(value);
-}
-
-bool isLeapYear(int year) {
-  return (year % 4 == 0 && year % 100 != 0) || year % 400 == 0;
-}
-
-int daysInMonth(int year, int month) {
-  static constexpr int kDays[] = {31, 28, 31, 30, 31, 30, 31, 31, 30, 31, 30, 31};
-  return month == 2 && isLeapYear(year) ? 29 : kDays[month - 1];
 }
 
 std::string twoDigits(int n) {
@@ -236,7 +222,7 @@ class ComponentReader {
     if (t.month < 1 || t.month > 12) {
       throw error(property, name(property) + ": there is no month " + std::to_string(t.month));
     }
-    if (t.day < 1 || t.day > daysInMonth(t.year, t.month)) {
+    if (!zt::platform::isCalendarDay(t.year, t.month, t.day)) {
       throw error(property, name(property) + ": month " + std::to_string(t.month) + " of " +
                                 std::to_string(t.year) + " has no day " + std::to_string(t.day));
     }
@@ -344,7 +330,7 @@ std::optional<Dictionary> recurrenceRecord(const ComponentReader& reader, icalpr
 // "needsaction").
 std::string participationWord(std::string_view partstat) {
   std::string word;
-  for (char c : lowerCased(partstat)) {
+  for (char c : lowerAscii(partstat)) {
     if (c != '-') word += c;
   }
   return word;
@@ -362,17 +348,17 @@ Dictionary participantRecord(icalproperty* property, std::string_view entity) {
   record.set(TesselAttribute_Calendars_Attendee_Email, Value(valueText(property)));
   if (!attendee) return record;
   if (auto cutype = parameter(property, "CUTYPE")) {
-    record.set(TesselAttribute_Calendars_Attendee_UserType, Value(lowerCased(*cutype)));
+    record.set(TesselAttribute_Calendars_Attendee_UserType, Value(lowerAscii(*cutype)));
   }
   if (auto role = parameter(property, "ROLE")) {
-    record.set(TesselAttribute_Calendars_Attendee_Role, Value(lowerCased(*role)));
+    record.set(TesselAttribute_Calendars_Attendee_Role, Value(lowerAscii(*role)));
   }
   if (auto partstat = parameter(property, "PARTSTAT")) {
     record.set(TesselAttribute_Calendars_Attendee_Status, Value(participationWord(*partstat)));
   }
   if (auto rsvp = parameter(property, "RSVP")) {
     record.set(TesselAttribute_Calendars_Attendee_Rsvp,
-               Value::boolean(lowerCased(*rsvp) == "true"));
+               Value::boolean(lowerAscii(*rsvp) == "true"));
   }
   if (auto to = parameter(property, "DELEGATED-TO")) {
     record.set(TesselAttribute_Calendars_Attendee_Delegatedto, Value(*to));
@@ -456,7 +442,7 @@ std::optional<Dictionary> alarmRecord(const ICalDocument& document, ICalTimeZone
     }
     // The schema counts from the start; RELATED=END counts from the end (section 3.2.14).
     const std::optional<std::string> related = parameter(trigger, "RELATED");
-    if (related && lowerCased(*related) == "end" && start && end) {
+    if (related && lowerAscii(*related) == "end" && start && end) {
       seconds += (end->date.instant() - start->date.instant()).count();
     }
     record.set(TesselAttribute_Calendars_AudioAlarm_Triggerduration, Value::integer(seconds));
@@ -504,10 +490,10 @@ ItemFields readFields(const ComponentReader& reader, icalcomponent* component) {
         break;
       case ICAL_STATUS_PROPERTY:
         // The schema's status words are RFC 5545 section 3.8.1.11's in lower case.
-        fields.status = lowerCased(valueText(property));
+        fields.status = lowerAscii(valueText(property));
         break;
       case ICAL_CLASS_PROPERTY:
-        fields.classification = lowerCased(valueText(property));
+        fields.classification = lowerAscii(valueText(property));
         break;
       case ICAL_URL_PROPERTY:
         fields.url = text(icalproperty_get_url(property));
@@ -615,7 +601,7 @@ class CalendarBuilder {
       if (namedTitle || icalproperty_isa(property) != ICAL_X_PROPERTY) continue;
       const char* name = icalproperty_get_x_name(property);
       // X-WR-CALNAME: the calendar's name as Apple, Google and Outlook export it.
-      if (name != nullptr && lowerCased(name) == "x-wr-calname") {
+      if (name != nullptr && lowerAscii(name) == "x-wr-calname") {
         namedTitle = text(icalproperty_get_x(property));
       }
     }

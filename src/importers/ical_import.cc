@@ -10,6 +10,7 @@
 #include <sstream>
 #include <system_error>
 
+#include "platform/ascii.h"
 #include "platform/value.h"
 #include "tessel/schema.h"
 
@@ -22,13 +23,6 @@ namespace {
 using zt::platform::Array;
 using zt::platform::Dictionary;
 using zt::platform::Value;
-
-std::string lowerCased(std::string text) {
-  for (char& c : text) {
-    if (c >= 'A' && c <= 'Z') c = static_cast<char>(c - 'A' + 'a');
-  }
-  return text;
-}
 
 std::string readText(const fs::path& path, const std::string& name) {
   std::ifstream in(path, std::ios::binary);
@@ -61,7 +55,8 @@ ICalCalendarSource folderSource(const fs::path& folder, const std::string& name,
   std::error_code error;
   for (fs::directory_iterator it(folder, error), end; !error && it != end; it.increment(error)) {
     if (!it->is_regular_file(error)) continue;
-    if (lowerCased(it->path().extension().string()) == ".ics") files.push_back(it->path());
+    if (zt::platform::lowerAscii(it->path().extension().string()) == ".ics")
+      files.push_back(it->path());
   }
   if (error) throw ImportError(name, std::nullopt, "cannot list the folder: " + error.message());
   // Folder order is the file system's; file names give a stable one.

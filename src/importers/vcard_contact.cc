@@ -8,6 +8,7 @@
 #include "importers/import_error.h"
 #include "importers/vcard_decoding.h"
 #include "importers/vcard_identifiers.h"
+#include "platform/ascii.h"
 #include "tessel/schema.h"
 
 namespace tessel::importers {
@@ -16,6 +17,8 @@ namespace {
 
 using zt::platform::Data;
 using zt::platform::Dictionary;
+using zt::platform::lowerAscii;
+using zt::platform::trimBlanks;
 using zt::platform::Url;
 using zt::platform::Value;
 

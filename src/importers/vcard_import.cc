@@ -14,6 +14,7 @@
 #include "importers/vcard_decoding.h"
 #include "importers/vcard_identifiers.h"
 #include "importers/vcard_reader.h"
+#include "platform/ascii.h"
 #include "tessel/schema.h"
 
 namespace tessel::importers {
@@ -22,6 +23,7 @@ namespace {
 
 using zt::platform::Array;
 using zt::platform::Dictionary;
+using zt::platform::lowerAscii;
 using zt::platform::Value;
 
 namespace fs = std::filesystem;

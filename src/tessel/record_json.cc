@@ -11,6 +11,7 @@
 #include <utility>
 
 #include "platform/base64.h"
+#include "platform/calendar_day.h"
 #include "tessel/schema.h"
 
 namespace tessel {
@@ -104,68 +105,33 @@ std::string_view jsonKindName(const Json& json) {
   }
 }
 
-// ----- base64 (RFC 4648, standard alphabet, padded; the encoder is the platform's) ----------
-
-constexpr std::string_view kBase64Alphabet =
-    "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";
+// ----- base64 (RFC 4648, standard alphabet, padded; both ways the platform's) -------------
 
 // Only the canonical text is accepted (padding present, unused bits zero), so that a byte
 // string has exactly one written form and a damaged text is noticed rather than guessed at.
 std::optional<Data> decodeBase64(std::string_view text, std::string& why) {
-  static const std::array<int, 256> kDigit = [] {
-    std::array<int, 256> table{};
-    table.fill(-1);
-    for (std::size_t i = 0; i < kBase64Alphabet.size(); ++i) {
-      table[static_cast<unsigned char>(kBase64Alphabet[i])] = static_cast<int>(i);
-    }
-    return table;
-  }();
-  if (text.size() % 4 != 0) {
-    why = "base64 text length " + std::to_string(text.size()) + " is not a multiple of 4";
-    return std::nullopt;
-  }
-  Data out;
-  out.reserve(text.size() / 4 * 3);
-  for (std::size_t i = 0; i < text.size(); i += 4) {
-    const bool last = i + 4 == text.size();
-    std::size_t padding = 0;
-    if (last && text[i + 3] == '=') padding = text[i + 2] == '=' ? 2 : 1;
-    std::uint32_t n = 0;
-    for (std::size_t j = 0; j < 4; ++j) {
-      const char c = text[i + j];
-      if (j >= 4 - padding) {
-        n <<= 6;
-        continue;
-      }
-      const int digit = kDigit[static_cast<unsigned char>(c)];
-      if (digit < 0) {
-        why = "invalid base64 character " + jsonQuoted(std::string(1, c)) + " at offset " +
-              std::to_string(i + j);
-        return std::nullopt;
-      }
-      n = (n << 6) | static_cast<std::uint32_t>(digit);
-    }
-    if ((padding == 1 && (n & 0xFF) != 0) || (padding == 2 && (n & 0xFFFF) != 0)) {
+  using zt::platform::base64::DecodeFault;
+  DecodeFault fault{};
+  std::optional<Data> out =
+      zt::platform::base64::decode(text, zt::platform::base64::Form::Canonical, &fault);
+  if (out) return out;
+  switch (fault.kind) {
+    case DecodeFault::Kind::Length:
+      why = "base64 text length " + std::to_string(text.size()) + " is not a multiple of 4";
+      break;
+    case DecodeFault::Kind::Character:
+      why = "invalid base64 character " + jsonQuoted(text.substr(fault.offset, 1)) + " at offset " +
+            std::to_string(fault.offset);
+      break;
+    case DecodeFault::Kind::StrayBits:
+    case DecodeFault::Kind::Padding:
       why = "base64 text has stray bits before its padding";
-      return std::nullopt;
-    }
-    out.push_back(static_cast<std::uint8_t>(n >> 16));
-    if (padding < 2) out.push_back(static_cast<std::uint8_t>(n >> 8));
-    if (padding < 1) out.push_back(static_cast<std::uint8_t>(n));
+      break;
   }
-  return out;
+  return std::nullopt;
 }
 
 // ----- dates -------------------------------------------------------------------------------
-
-bool isLeapYear(std::int64_t year) {
-  return (year % 4 == 0 && year % 100 != 0) || year % 400 == 0;
-}
-
-int daysInMonth(std::int64_t year, int month) {
-  static constexpr std::array<int, 12> kDays = {31, 28, 31, 30, 31, 30, 31, 31, 30, 31, 30, 31};
-  return month == 2 && isLeapYear(year) ? 29 : kDays[static_cast<std::size_t>(month - 1)];
-}
 
 struct WallClock {
   CalendarDate::Fields fields;
@@ -223,7 +189,7 @@ std::optional<WallClock> parseWallClock(std::string_view text, std::string& why)
 
   if (month < 1 || month > 12) {
     why = "date " + jsonQuoted(text) + " has month " + std::to_string(month);
-  } else if (day < 1 || day > daysInMonth(year, static_cast<int>(month))) {
+  } else if (!zt::platform::isCalendarDay(year, month, day)) {
     why = "date " + jsonQuoted(text) + " has day " + std::to_string(day) + ", not in that month";
   } else if (hour > 23) {
     why = "date " + jsonQuoted(text) + " has hour " + std::to_string(hour);

@@ -5,6 +5,7 @@
 #include <cstdio>
 #include <cstdlib>
 
+#include "platform/calendar_day.h"
 #include "tessel/record_json.h"
 
 namespace tessel::cli {
@@ -46,13 +47,6 @@ bool readChar(std::string_view text, std::size_t& pos, char c) {
   return false;
 }
 
-bool isValidDay(int year, int month, int day) {
-  static constexpr int kDays[] = {31, 28, 31, 30, 31, 30, 31, 31, 30, 31, 30, 31};
-  if (month < 1 || month > 12 || day < 1) return false;
-  const bool leap = (year % 4 == 0 && year % 100 != 0) || year % 400 == 0;
-  return day <= (month == 2 && leap ? 29 : kDays[month - 1]);
-}
-
 std::optional<CalendarDate> parseIsoDate(std::string_view text) {
   std::size_t pos = 0;
   CalendarDate::Fields f;
@@ -64,7 +58,8 @@ std::optional<CalendarDate> parseIsoDate(std::string_view text) {
       !readDigits(text, pos, 2, f.second)) {
     return std::nullopt;
   }
-  if (!isValidDay(f.year, f.month, f.day) || f.hour > 23 || f.minute > 59 || f.second > 59) {
+  if (!zt::platform::isCalendarDay(f.year, f.month, f.day) || f.hour > 23 || f.minute > 59 ||
+      f.second > 59) {
     return std::nullopt;
   }
   std::uint32_t nanoseconds = 0;
