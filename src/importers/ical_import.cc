@@ -108,6 +108,95 @@ constexpr std::string_view kOwnedRelationships[] = {
     TesselRelationship_Calendars_Event_DetachedEvents,
 };
 
+// What the store holds now of the calendars an import writes.
+struct StoredCalendars {
+  // The records of each calendar, but for the Calendar record itself.
+  std::map<std::string, RecordMap> records;
+  // The identifiers of every Calendar record.
+  std::set<std::string> live;
+  // The calendars the CalendarOrder record lists.
+  std::vector<std::string> order;
+};
+
+StoredCalendars storedCalendars(const Store& store, const std::vector<ICalCalendar>& calendars) {
+  StoredCalendars stored;
+  for (const ICalCalendar& calendar : calendars) stored.records[calendar.identifier];
+  store.forEachRecord([&](const Record& record) {
+    const Value* entity = record.record.find(TesselRecordEntityNameKey);
+    const std::string* name = entity != nullptr ? entity->asString() : nullptr;
+    if (name != nullptr && *name == TesselEntity_Calendars_Calendar) stored.live.insert(record.id);
+    if (name != nullptr && *name == TesselEntity_Calendars_CalendarOrder && stored.order.empty()) {
+      appendStrings(arrayAt(record.record, TesselRelationship_Calendars_CalendarOrder_Calendars),
+                    stored.order);
+    }
+    const auto found = stored.records.find(calendarOf(record.id));
+    if (found != stored.records.end() && record.id.size() > found->first.size()) {
+      found->second.emplace(record.id, record.record);
+    }
+  });
+  return stored;
+}
+
+// Adds to `records` what one calendar puts, and to `stale` what it deletes of the records the
+// store held of it (`before`).
+void mergeCalendar(const ICalCalendar& calendar, const RecordMap& before, SyncDeletes syncDeletes,
+                   std::vector<Record>& records, std::vector<std::string>& stale) {
+  std::set<std::string> produced;
+  for (const Record& record : calendar.records) produced.insert(record.id);
+
+  std::vector<Record> written = calendar.records;
+  std::set<std::string> kept;
+  if (syncDeletes == SyncDeletes::Off) {
+    // Events and tasks that left the source stay, listed in their calendar as before, and
+    // so do the records they list.
+    std::vector<std::string> keptEvents, keptTasks;
+    for (const auto& [id, record] : before) {
+      const Value* entity = record.find(TesselRecordEntityNameKey);
+      const std::string* name = entity != nullptr ? entity->asString() : nullptr;
+      if (name == nullptr || produced.count(id) != 0) continue;
+      const bool event = *name == TesselEntity_Calendars_Event;
+      if (!event && *name != TesselEntity_Calendars_Task) continue;
+      (event ? keptEvents : keptTasks).push_back(id);
+      kept.insert(id);
+      std::vector<std::string> owned;
+      for (std::string_view key : kOwnedRelationships) appendStrings(arrayAt(record, key), owned);
+      kept.insert(owned.begin(), owned.end());
+    }
+    Dictionary& calendarRecord = written.front().record;
+    const auto extend = [&](std::string_view key, const std::vector<std::string>& ids) {
+      if (ids.empty()) return;
+      Array list = *arrayAt(calendarRecord, key);
+      for (const std::string& id : ids) list.emplace_back(id);
+      calendarRecord.set(key, Value(std::move(list)));
+    };
+    extend(TesselRelationship_Calendars_Calendar_Events, keptEvents);
+    extend(TesselRelationship_Calendars_Calendar_Tasks, keptTasks);
+  }
+  for (const auto& [id, record] : before) {
+    if (produced.count(id) == 0 && kept.count(id) == 0) stale.push_back(id);
+  }
+  for (Record& record : written) records.push_back(std::move(record));
+}
+
+// The order keeps the calendars it lists that still exist, then the new ones.
+std::vector<std::string> calendarOrder(const std::vector<std::string>& order,
+                                       const std::set<std::string>& liveCalendars,
+                                       const std::vector<ICalCalendar>& calendars) {
+  std::vector<std::string> newOrder;
+  for (const std::string& id : order) {
+    if (liveCalendars.count(id) != 0 &&
+        std::find(newOrder.begin(), newOrder.end(), id) == newOrder.end()) {
+      newOrder.push_back(id);
+    }
+  }
+  for (const ICalCalendar& calendar : calendars) {
+    if (std::find(newOrder.begin(), newOrder.end(), calendar.identifier) == newOrder.end()) {
+      newOrder.push_back(calendar.identifier);
+    }
+  }
+  return newOrder;
+}
+
 }  // namespace
 
 std::string calendarIdentifierForPath(const fs::path& path) {
@@ -150,84 +239,17 @@ std::vector<ICalCalendar> readICalendarPaths(const std::vector<fs::path>& paths,
 
 ICalImportCounts writeICalCalendars(Store& store, const std::vector<ICalCalendar>& calendars,
                                     SyncDeletes syncDeletes) {
-  // What the store holds of these calendars now, by calendar.
-  std::map<std::string, RecordMap> stored;
-  for (const ICalCalendar& calendar : calendars) stored[calendar.identifier];
-  std::set<std::string> liveCalendars;
-  std::vector<std::string> order;
-  store.forEachRecord([&](const Record& record) {
-    const Value* entity = record.record.find(TesselRecordEntityNameKey);
-    const std::string* name = entity != nullptr ? entity->asString() : nullptr;
-    if (name != nullptr && *name == TesselEntity_Calendars_Calendar)
-      liveCalendars.insert(record.id);
-    if (name != nullptr && *name == TesselEntity_Calendars_CalendarOrder && order.empty()) {
-      appendStrings(arrayAt(record.record, TesselRelationship_Calendars_CalendarOrder_Calendars),
-                    order);
-    }
-    const auto found = stored.find(calendarOf(record.id));
-    if (found != stored.end() && record.id.size() > found->first.size()) {
-      found->second.emplace(record.id, record.record);
-    }
-  });
-
+  StoredCalendars stored = storedCalendars(store, calendars);
   std::vector<Record> records;
   std::vector<std::string> stale;
   for (const ICalCalendar& calendar : calendars) {
-    const RecordMap& before = stored[calendar.identifier];
-    std::set<std::string> produced;
-    for (const Record& record : calendar.records) produced.insert(record.id);
-
-    std::vector<Record> written = calendar.records;
-    std::set<std::string> kept;
-    if (syncDeletes == SyncDeletes::Off) {
-      // Events and tasks that left the source stay, listed in their calendar as before, and
-      // so do the records they list.
-      std::vector<std::string> keptEvents, keptTasks;
-      for (const auto& [id, record] : before) {
-        const Value* entity = record.find(TesselRecordEntityNameKey);
-        const std::string* name = entity != nullptr ? entity->asString() : nullptr;
-        if (name == nullptr || produced.count(id) != 0) continue;
-        const bool event = *name == TesselEntity_Calendars_Event;
-        if (!event && *name != TesselEntity_Calendars_Task) continue;
-        (event ? keptEvents : keptTasks).push_back(id);
-        kept.insert(id);
-        std::vector<std::string> owned;
-        for (std::string_view key : kOwnedRelationships) appendStrings(arrayAt(record, key), owned);
-        kept.insert(owned.begin(), owned.end());
-      }
-      Dictionary& calendarRecord = written.front().record;
-      const auto extend = [&](std::string_view key, const std::vector<std::string>& ids) {
-        if (ids.empty()) return;
-        Array list = *arrayAt(calendarRecord, key);
-        for (const std::string& id : ids) list.emplace_back(id);
-        calendarRecord.set(key, Value(std::move(list)));
-      };
-      extend(TesselRelationship_Calendars_Calendar_Events, keptEvents);
-      extend(TesselRelationship_Calendars_Calendar_Tasks, keptTasks);
-    }
-    for (const auto& [id, record] : before) {
-      if (produced.count(id) == 0 && kept.count(id) == 0) stale.push_back(id);
-    }
-    for (Record& record : written) records.push_back(std::move(record));
+    mergeCalendar(calendar, stored.records[calendar.identifier], syncDeletes, records, stale);
   }
-
-  // The order keeps the calendars it lists that still exist, then the new ones.
-  std::vector<std::string> newOrder;
-  for (const ICalCalendar& calendar : calendars) liveCalendars.insert(calendar.identifier);
-  for (const std::string& id : order) {
-    if (liveCalendars.count(id) != 0 &&
-        std::find(newOrder.begin(), newOrder.end(), id) == newOrder.end()) {
-      newOrder.push_back(id);
-    }
-  }
-  for (const ICalCalendar& calendar : calendars) {
-    if (std::find(newOrder.begin(), newOrder.end(), calendar.identifier) == newOrder.end()) {
-      newOrder.push_back(calendar.identifier);
-    }
-  }
+  for (const ICalCalendar& calendar : calendars) stored.live.insert(calendar.identifier);
+  const std::vector<std::string> order = calendarOrder(stored.order, stored.live, calendars);
 
   // One transaction: an interrupted import leaves the store as it was.
-  AppliedChanges applied = store.applyChanges(StoreChanges{records, stale, newOrder});
+  AppliedChanges applied = store.applyChanges(StoreChanges{records, stale, order});
   ICalImportCounts counts;
   counts.written = applied.written;
   counts.deleted = applied.deleted;

@@ -58,6 +58,74 @@ std::vector<std::string> stringsOf(const Value* value) {
   return strings;
 }
 
+// What earlier imports left in the store that this one does not write again.
+struct EarlierImports {
+  // Their records to delete.
+  std::vector<std::string> deletions;
+  // The members of their groups that stay, by group identifier.
+  std::map<std::string, std::vector<std::string>> groupMembers;
+};
+
+EarlierImports earlierImports(const Store& store, const std::vector<Record>& records,
+                              const std::set<std::string, std::less<>>& importedContacts,
+                              SyncDeletes syncDeletes) {
+  std::unordered_set<std::string> produced;
+  for (const Record& record : records) produced.insert(record.id);
+  EarlierImports earlier;
+  store.forEachRecord([&](const Record& record) {
+    if (!isImportedIdentifier(record.id) || produced.contains(record.id)) {
+      if (record.id.starts_with(kGroupPrefix)) {
+        earlier.groupMembers[record.id] =
+            stringsOf(record.record.find(TesselRelationship_Contacts_Group_Members));
+      }
+      return;
+    }
+    const std::string_view owner = owningContactIdentifier(record.id);
+    // The related records a re-imported contact no longer has are its own garbage.
+    if (syncDeletes == SyncDeletes::On || (!owner.empty() && importedContacts.contains(owner))) {
+      earlier.deletions.push_back(record.id);
+    } else if (record.id.starts_with(kGroupPrefix)) {
+      earlier.groupMembers[record.id] =
+          stringsOf(record.record.find(TesselRelationship_Contacts_Group_Members));
+    }
+  });
+  return earlier;
+}
+
+// A group keeps the contacts of earlier imports that this one did not read again: in the
+// group record this import writes, or in the stored one, written again when it lost members.
+void keepEarlierMembers(const Store& store,
+                        const std::map<std::string, std::vector<std::string>>& earlierMembers,
+                        const std::set<std::string, std::less<>>& importedContacts,
+                        std::vector<Record>& records) {
+  std::map<std::string, std::size_t> groupRecords;
+  for (std::size_t i = 0; i < records.size(); ++i) {
+    if (records[i].id.starts_with(kGroupPrefix)) groupRecords[records[i].id] = i;
+  }
+  for (const auto& [identifier, members] : earlierMembers) {
+    std::vector<std::string> kept;
+    for (const std::string& member : members) {
+      if (!importedContacts.contains(member)) kept.push_back(member);
+    }
+    auto producedGroup = groupRecords.find(identifier);
+    if (producedGroup == groupRecords.end()) {
+      if (kept == members) continue;
+      std::optional<Dictionary> earlier = store.record(identifier);
+      if (!earlier) continue;
+      earlier->set(TesselRelationship_Contacts_Group_Members, identifierArray(kept));
+      records.push_back(Record{identifier, std::move(*earlier)});
+      continue;
+    }
+    Dictionary& group = records[producedGroup->second].record;
+    std::vector<std::string> now = stringsOf(group.find(TesselRelationship_Contacts_Group_Members));
+    for (std::string& member : now) {
+      if (std::find(kept.begin(), kept.end(), member) == kept.end()) kept.push_back(member);
+    }
+    std::sort(kept.begin(), kept.end());
+    group.set(TesselRelationship_Contacts_Group_Members, identifierArray(kept));
+  }
+}
+
 }  // namespace
 
 void VCardImport::addPaths(const std::vector<fs::path>& paths) {
@@ -186,70 +254,21 @@ std::vector<Record> VCardImport::records() const {
 
 VCardImportSummary VCardImport::writeTo(Store& store, SyncDeletes syncDeletes) const {
   std::vector<Record> records = this->records();
-  std::unordered_set<std::string> produced;
-  for (const Record& record : records) produced.insert(record.id);
   std::set<std::string, std::less<>> importedContacts;
   for (const ConvertedCard& contact : contacts_) importedContacts.insert(contact.identifier);
 
-  // What earlier imports left: their identifiers, and their groups' members.
-  std::vector<std::string> deletions;
-  std::map<std::string, std::vector<std::string>> earlierMembers;
-  store.forEachRecord([&](const Record& record) {
-    if (!isImportedIdentifier(record.id) || produced.contains(record.id)) {
-      if (record.id.starts_with(kGroupPrefix)) {
-        earlierMembers[record.id] =
-            stringsOf(record.record.find(TesselRelationship_Contacts_Group_Members));
-      }
-      return;
-    }
-    const std::string_view owner = owningContactIdentifier(record.id);
-    // The related records a re-imported contact no longer has are its own garbage.
-    if (syncDeletes == SyncDeletes::On || (!owner.empty() && importedContacts.contains(owner))) {
-      deletions.push_back(record.id);
-    } else if (record.id.starts_with(kGroupPrefix)) {
-      earlierMembers[record.id] =
-          stringsOf(record.record.find(TesselRelationship_Contacts_Group_Members));
-    }
-  });
-
+  EarlierImports earlier = earlierImports(store, records, importedContacts, syncDeletes);
   if (syncDeletes == SyncDeletes::Off) {
-    // A group keeps the contacts of earlier imports that this one did not read again.
-    std::map<std::string, std::size_t> groupRecords;
-    for (std::size_t i = 0; i < records.size(); ++i) {
-      if (records[i].id.starts_with(kGroupPrefix)) groupRecords[records[i].id] = i;
-    }
-    for (const auto& [identifier, members] : earlierMembers) {
-      std::vector<std::string> kept;
-      for (const std::string& member : members) {
-        if (!importedContacts.contains(member)) kept.push_back(member);
-      }
-      auto producedGroup = groupRecords.find(identifier);
-      if (producedGroup == groupRecords.end()) {
-        if (kept == members) continue;
-        std::optional<Dictionary> earlier = store.record(identifier);
-        if (!earlier) continue;
-        earlier->set(TesselRelationship_Contacts_Group_Members, identifierArray(kept));
-        records.push_back(Record{identifier, std::move(*earlier)});
-        continue;
-      }
-      Dictionary& group = records[producedGroup->second].record;
-      std::vector<std::string> now =
-          stringsOf(group.find(TesselRelationship_Contacts_Group_Members));
-      for (std::string& member : now) {
-        if (std::find(kept.begin(), kept.end(), member) == kept.end()) kept.push_back(member);
-      }
-      std::sort(kept.begin(), kept.end());
-      group.set(TesselRelationship_Contacts_Group_Members, identifierArray(kept));
-    }
+    keepEarlierMembers(store, earlier.groupMembers, importedContacts, records);
   }
 
   VCardImportSummary summary;
   summary.contacts = contactCount();
   summary.groups = groupCount();
   summary.files = files_;
-  // The store writes and deletes in separate transactions; everything that can fail (the
-  // inputs) was checked before the first of them.
-  AppliedChanges applied = store.applyChanges(StoreChanges{records, deletions, std::nullopt});
+  // One transaction: an interrupted import leaves the store as it was.
+  AppliedChanges applied =
+      store.applyChanges(StoreChanges{records, earlier.deletions, std::nullopt});
   summary.written = applied.written;
   summary.deleted = applied.deleted;
   return summary;
