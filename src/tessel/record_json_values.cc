@@ -7,7 +7,7 @@
 #include <utility>
 
 #include "platform/base64.h"
-#include "platform/calendar_day.h"
+#include "platform/iso_wall_clock.h"
 
 namespace tessel::typed_json {
 
@@ -59,70 +59,46 @@ struct WallClock {
 // "YYYY-MM-DDTHH:MM[:SS[.fraction]]"; the year may have more than four digits and a sign, so
 // that every date the store can hold has a written form.
 std::optional<WallClock> parseWallClock(std::string_view text, std::string& why) {
+  namespace iso = zt::platform::iso;
+  const std::string quoted = jsonQuoted(text);
+  why = "date " + quoted + " is not of the form YYYY-MM-DDTHH:MM[:SS[.fraction]]";
   std::size_t pos = 0;
-  auto digits = [&](std::size_t minCount, std::size_t maxCount, std::int64_t& out) -> bool {
-    std::size_t start = pos;
-    out = 0;
-    while (pos < text.size() && pos - start < maxCount && text[pos] >= '0' && text[pos] <= '9') {
-      out = out * 10 + (text[pos] - '0');
-      ++pos;
+  iso::ReadFault fault = iso::ReadFault::Form;
+  const std::optional<iso::WallClock> read =
+      iso::readWallClock(text, pos, iso::YearForm::Extended, iso::SecondsForm::Optional, &fault);
+  if (!read) {
+    if (fault == iso::ReadFault::LongFraction) {
+      why = "date " + quoted + " has more than nine fractional digits";
     }
-    return pos - start >= minCount;
-  };
-  auto expect = [&](char c) {
-    if (pos < text.size() && text[pos] == c) {
-      ++pos;
-      return true;
-    }
-    return false;
-  };
-  why = "date " + jsonQuoted(text) + " is not of the form YYYY-MM-DDTHH:MM[:SS[.fraction]]";
-
-  const bool negative = expect('-');
-  std::int64_t year = 0, month = 0, day = 0, hour = 0, minute = 0, second = 0;
-  // Nine digits of year keep the arithmetic far from overflow and cover every 64-bit instant
-  // anyone writes down.
-  if (!digits(4, 9, year) || !expect('-') || !digits(2, 2, month) || !expect('-') ||
-      !digits(2, 2, day) || !expect('T') || !digits(2, 2, hour) || !expect(':') ||
-      !digits(2, 2, minute)) {
     return std::nullopt;
   }
-  std::uint32_t nanoseconds = 0;
-  if (expect(':')) {
-    if (!digits(2, 2, second)) return std::nullopt;
-    if (expect('.')) {
-      std::int64_t fraction = 0;
-      const std::size_t start = pos;
-      if (!digits(1, 9, fraction)) return std::nullopt;
-      for (std::size_t n = pos - start; n < 9; ++n) fraction *= 10;
-      nanoseconds = static_cast<std::uint32_t>(fraction);
-      if (pos < text.size() && text[pos] >= '0' && text[pos] <= '9') {
-        why = "date " + jsonQuoted(text) + " has more than nine fractional digits";
-        return std::nullopt;
-      }
-    }
-  }
   if (pos != text.size()) return std::nullopt;
-  if (negative) year = -year;
 
-  if (month < 1 || month > 12) {
-    why = "date " + jsonQuoted(text) + " has month " + std::to_string(month);
-  } else if (!zt::platform::isCalendarDay(year, month, day)) {
-    why = "date " + jsonQuoted(text) + " has day " + std::to_string(day) + ", not in that month";
-  } else if (hour > 23) {
-    why = "date " + jsonQuoted(text) + " has hour " + std::to_string(hour);
-  } else if (minute > 59) {
-    why = "date " + jsonQuoted(text) + " has minute " + std::to_string(minute);
-  } else if (second > 59) {
-    why = "date " + jsonQuoted(text) + " has second " + std::to_string(second);
-  } else {
-    WallClock clock;
-    clock.fields = {static_cast<int>(year), static_cast<int>(month),  static_cast<int>(day),
-                    static_cast<int>(hour), static_cast<int>(minute), static_cast<int>(second)};
-    clock.nanoseconds = nanoseconds;
-    return clock;
+  const iso::WallClock& f = *read;
+  switch (iso::firstInvalidField(f)) {
+    case iso::Field::Month:
+      why = "date " + quoted + " has month " + std::to_string(f.month);
+      return std::nullopt;
+    case iso::Field::Day:
+      why = "date " + quoted + " has day " + std::to_string(f.day) + ", not in that month";
+      return std::nullopt;
+    case iso::Field::Hour:
+      why = "date " + quoted + " has hour " + std::to_string(f.hour);
+      return std::nullopt;
+    case iso::Field::Minute:
+      why = "date " + quoted + " has minute " + std::to_string(f.minute);
+      return std::nullopt;
+    case iso::Field::Second:
+      why = "date " + quoted + " has second " + std::to_string(f.second);
+      return std::nullopt;
+    case iso::Field::None:
+      break;
   }
-  return std::nullopt;
+  WallClock clock;
+  clock.fields = {static_cast<int>(f.year), static_cast<int>(f.month),  static_cast<int>(f.day),
+                  static_cast<int>(f.hour), static_cast<int>(f.minute), static_cast<int>(f.second)};
+  clock.nanoseconds = f.nanoseconds;
+  return clock;
 }
 
 std::string formatWallClock(const CalendarDate& date) {
@@ -134,14 +110,7 @@ std::string formatWallClock(const CalendarDate& date) {
   std::array<char, 32> buffer{};
   std::snprintf(buffer.data(), buffer.size(), "-%02d-%02dT%02d:%02d:%02d", f.month, f.day, f.hour,
                 f.minute, f.second);
-  std::string out = year + buffer.data();
-  if (date.nanoseconds() != 0) {
-    std::snprintf(buffer.data(), buffer.size(), ".%09u", static_cast<unsigned>(date.nanoseconds()));
-    std::string fraction = buffer.data();
-    while (fraction.back() == '0') fraction.pop_back();
-    out += fraction;
-  }
-  return out;
+  return year + buffer.data() + zt::platform::iso::fraction(date.nanoseconds());
 }
 
 // ----- zones -------------------------------------------------------------------------------
