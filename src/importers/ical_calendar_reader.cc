@@ -15,6 +15,7 @@
 #include "importers/ical_properties.h"
 #include "importers/ical_recurrence.h"
 #include "importers/ical_time_zones.h"
+#include "importers/stable_hash.h"
 #include "platform/ascii.h"
 #include "platform/calendar_date.h"
 #include "platform/value.h"
@@ -58,18 +59,6 @@ std::string escapedUid(std::string_view uid) {
     }
   }
   return escaped;
-}
-
-std::string hexHash(std::string_view text) {
-  std::uint64_t hash = 0xcbf29ce484222325ULL;  // FNV-1a
-  for (char c : text) {
-    hash ^= static_cast<unsigned char>(c);
-    hash *= 0x100000001b3ULL;
-  }
-  static constexpr char kHex[] = "0123456789abcdef";
-  std::string hex(16, '0');
-  for (int i = 15; i >= 0; --i, hash >>= 4) hex[static_cast<std::size_t>(i)] = kHex[hash & 0xF];
-  return hex;
 }
 
 // ----- the calendar: its events and tasks, each followed by its sub-records ---------------
@@ -187,7 +176,7 @@ class CalendarBuilder {
           source_.identifier + (item.kind == ItemKind::Event ? "/event/" : "/task/");
       // RFC 5545 section 3.8.4.7 wants a UID in every component; for the few exporters that
       // leave it out, what the component says stands in, which stays stable while it does.
-      identifier += item.uid.empty() ? "no-uid-" + hexHash(fallback) : escapedUid(item.uid);
+      identifier += item.uid.empty() ? "no-uid-" + stableHash(fallback) : escapedUid(item.uid);
       if (item.recurrenceId) {
         const ReadDate& rid = *item.recurrenceId;
         identifier += "/";

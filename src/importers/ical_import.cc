@@ -10,6 +10,7 @@
 #include <sstream>
 #include <system_error>
 
+#include "importers/stable_hash.h"
 #include "platform/ascii.h"
 #include "platform/value.h"
 #include "tessel/schema.h"
@@ -203,15 +204,7 @@ std::string calendarIdentifierForPath(const fs::path& path) {
   std::error_code error;
   fs::path absolute = fs::canonical(path, error);
   if (error) absolute = fs::absolute(path, error).lexically_normal();
-  std::uint64_t hash = 0xcbf29ce484222325ULL;  // FNV-1a
-  for (char c : absolute.string()) {
-    hash ^= static_cast<unsigned char>(c);
-    hash *= 0x100000001b3ULL;
-  }
-  static constexpr char kHex[] = "0123456789abcdef";
-  std::string identifier = "ical-0000000000000000";
-  for (std::size_t i = identifier.size(); i-- > 5; hash >>= 4) identifier[i] = kHex[hash & 0xF];
-  return identifier;
+  return "ical-" + stableHash(absolute.string());
 }
 
 std::vector<ICalCalendar> readICalendarPaths(const std::vector<fs::path>& paths,
