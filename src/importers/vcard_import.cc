@@ -189,7 +189,7 @@ VCardImport::Groups VCardImport::groups() const {
     for (const std::string& name : contact.groupNames) addMember(name, contact.identifier);
     if (!contact.uid.empty()) {
       std::string uid = contact.uid;
-      if (lowerAscii(uid).starts_with("urn:uuid:")) uid.erase(0, 9);
+      if (zt::platform::startsWithIgnoringAsciiCase(uid, "urn:uuid:")) uid.erase(0, 9);
       contactOfUid.emplace(uid, contact.identifier);
     }
   }

@@ -11,8 +11,10 @@ namespace zt::platform {
 std::string lowerAscii(std::string_view text);
 std::string upperAscii(std::string_view text);
 
-// Whether `text` equals `word` when ASCII letters are compared without case.
+// Whether `text` equals `word`, or starts with `prefix`, when ASCII letters are compared
+// without case.
 bool equalsIgnoringAsciiCase(std::string_view text, std::string_view word);
+bool startsWithIgnoringAsciiCase(std::string_view text, std::string_view prefix);
 
 // Without blanks (space, tab) at either end.
 std::string_view trimBlanks(std::string_view text);
