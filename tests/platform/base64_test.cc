@@ -2,14 +2,11 @@
 
 #include <gtest/gtest.h>
 
-#include <optional>
 #include <string>
 #include <vector>
 
 namespace zt::platform::base64 {
 namespace {
-
-using Kind = DecodeFault::Kind;
 
 std::string decodedText(std::string_view text, Form form) {
   const auto bytes = decode(text, form);
@@ -42,20 +39,6 @@ TEST(Base64Decode, TheFormsDifferInBlanksPaddingAndUnusedBits) {
     EXPECT_EQ(decodedText(c.text, Form::Canonical), c.canonical) << c.text;
     EXPECT_EQ(decodedText(c.text, Form::Tolerant), c.tolerant) << c.text;
   }
-}
-
-TEST(Base64Decode, SaysWhyAndWhere) {
-  const auto faultOf = [](std::string_view text, Form form) {
-    DecodeFault fault{};
-    EXPECT_FALSE(decode(text, form, &fault)) << text;
-    return std::make_pair(fault.kind, fault.offset);
-  };
-  EXPECT_EQ(faultOf("TWE", Form::Canonical), std::make_pair(Kind::Length, std::size_t{3}));
-  EXPECT_EQ(faultOf("TWFu TWE=", Form::Canonical).first, Kind::Length);
-  EXPECT_EQ(faultOf("TWFuT-E=", Form::Canonical), std::make_pair(Kind::Character, std::size_t{5}));
-  EXPECT_EQ(faultOf("TWFuTWF=", Form::Canonical), std::make_pair(Kind::StrayBits, std::size_t{4}));
-  EXPECT_EQ(faultOf("TW-=", Form::Tolerant), std::make_pair(Kind::Character, std::size_t{2}));
-  EXPECT_EQ(faultOf("T", Form::Tolerant), std::make_pair(Kind::Padding, std::size_t{1}));
 }
 
 }  // namespace

@@ -57,12 +57,5 @@ TEST(IsoWallClock, TheFirstFieldOutOfRangeIsNamed) {
   EXPECT_EQ(firstInvalidField({2023, 2, 28, 23, 59, 60, 0}), Field::Second);
 }
 
-TEST(IsoWallClock, FractionsLoseTheirTrailingZeros) {
-  EXPECT_EQ(fraction(0), "");
-  EXPECT_EQ(fraction(500000000), ".5");
-  EXPECT_EQ(fraction(1000), ".000001");
-  EXPECT_EQ(fraction(123456789), ".123456789");
-}
-
 }  // namespace
 }  // namespace zt::platform::iso
