@@ -1,15 +1,13 @@
 #include "importers/ical_import.h"
 
 #include <algorithm>
-#include <cerrno>
 #include <cstdint>
-#include <cstring>
 #include <fstream>
 #include <map>
 #include <set>
-#include <sstream>
 #include <system_error>
 
+#include "importers/import_file.h"
 #include "importers/stable_hash.h"
 #include "platform/ascii.h"
 #include "platform/value.h"
@@ -24,16 +22,6 @@ namespace {
 using zt::platform::Array;
 using zt::platform::Dictionary;
 using zt::platform::Value;
-
-std::string readText(const fs::path& path, const std::string& name) {
-  std::ifstream in(path, std::ios::binary);
-  if (!in)
-    throw ImportError(name, std::nullopt, std::string("cannot read: ") + std::strerror(errno));
-  std::ostringstream text;
-  text << in.rdbuf();
-  if (in.bad()) throw ImportError(name, std::nullopt, "cannot read");
-  return std::move(text).str();
-}
 
 // The vdir format keeps a collection's name in a file "displayname" inside the folder.
 std::optional<std::string> vdirDisplayName(const fs::path& folder) {
@@ -64,7 +52,7 @@ ICalCalendarSource folderSource(const fs::path& folder, const std::string& name,
   std::sort(files.begin(), files.end());
   for (const fs::path& file : files) {
     const std::string fileName = (fs::path(name) / file.filename()).string();
-    source.files.push_back({fileName, readText(file, fileName)});
+    source.files.push_back({fileName, readImportFile(file, fileName)});
   }
   fs::path named = fs::canonical(folder, error);
   if (error) named = folder;
@@ -77,7 +65,7 @@ ICalCalendarSource fileSource(const fs::path& file, const std::string& name,
                               const std::optional<std::string>& title) {
   ICalCalendarSource source;
   source.identifier = calendarIdentifierForPath(file);
-  source.files.push_back({name, readText(file, name)});
+  source.files.push_back({name, readImportFile(file, name)});
   source.fallbackTitle = title ? *title : file.stem().string();
   return source;
 }

@@ -1,16 +1,13 @@
 #include "importers/vcard_import.h"
 
 #include <algorithm>
-#include <cerrno>
-#include <cstring>
-#include <fstream>
 #include <set>
-#include <sstream>
 #include <system_error>
 #include <unordered_set>
 #include <utility>
 
 #include "importers/import_error.h"
+#include "importers/import_file.h"
 #include "importers/vcard_decoding.h"
 #include "importers/vcard_identifiers.h"
 #include "importers/vcard_reader.h"
@@ -27,22 +24,6 @@ using zt::platform::lowerAscii;
 using zt::platform::Value;
 
 namespace fs = std::filesystem;
-
-std::string readFile(const fs::path& file) {
-  std::error_code error;
-  if (fs::is_directory(file, error)) {
-    throw ImportError(file.string(), std::nullopt, "cannot read: it is a folder");
-  }
-  std::ifstream in(file, std::ios::binary);
-  if (!in) {
-    throw ImportError(file.string(), std::nullopt,
-                      std::string("cannot read: ") + std::strerror(errno));
-  }
-  std::ostringstream text;
-  text << in.rdbuf();
-  if (in.bad()) throw ImportError(file.string(), std::nullopt, "cannot read");
-  return std::move(text).str();
-}
 
 Array identifierArray(const std::vector<std::string>& identifiers) {
   return Array(identifiers.begin(), identifiers.end());
@@ -151,7 +132,7 @@ void VCardImport::addPaths(const std::vector<fs::path>& paths) {
 }
 
 void VCardImport::addFile(const fs::path& file) {
-  addText(readFile(file), file.string());
+  addText(readImportFile(file, file.string()), file.string());
 }
 
 void VCardImport::addText(std::string_view text, const std::string& source) {
