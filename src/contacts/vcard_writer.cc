@@ -4,6 +4,7 @@
 #include <unordered_set>
 
 #include "contacts/vcard_text.h"
+#include "platform/ascii.h"
 #include "tessel/schema.h"
 
 namespace zt::contacts {
@@ -59,10 +60,7 @@ std::string_view addressPrefix(std::string_view type) {
 
 // Extension properties of RFC 2426 section 3.8, one per instant-messaging service.
 std::string_view imService(std::string_view service) {
-  std::string lower(service);
-  for (char& c : lower) {
-    if (c >= 'A' && c <= 'Z') c = static_cast<char>(c - 'A' + 'a');
-  }
+  const std::string lower = zt::platform::lowerAscii(service);
   if (lower == "jabber") return "X-JABBER;";
   if (lower == "msn") return "X-MSN;";
   if (lower == "yahoo") return "X-YAHOO;";

@@ -5,6 +5,7 @@
 #include <cstdlib>
 
 #include "icalendar/zeto_calendar_export.h"
+#include "platform/ascii.h"
 #include "platform/log.h"
 #include "platform/utf16.h"
 
@@ -230,11 +231,7 @@ std::string iCalendarRepresentationPartStat(std::string_view word) {
   if (word == "needsaction") return "NEEDS-ACTION";
   if (word == "inprocess") return "IN-PROCESS";
   // The words that reach here are ASCII; other bytes pass through unchanged.
-  std::string upper(word);
-  for (char& c : upper) {
-    if (c >= 'a' && c <= 'z') c = static_cast<char>(c - 'a' + 'A');
-  }
-  return upper;
+  return platform::upperAscii(word);
 }
 
 // --- Numbers ------------------------------------------------------------------------------

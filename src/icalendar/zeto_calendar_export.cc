@@ -4,12 +4,14 @@
 #include <cstdint>
 
 #include "icalendar/calendar_sync_extension.h"
+#include "platform/ascii.h"
 
 namespace zt::icalendar {
 
 namespace {
 
 using platform::CalendarDate;
+using platform::equalsIgnoringAsciiCase;
 using platform::TimeZone;
 
 // The two zones that stand for "no zone": looked up once by abbreviation, compared by zone
@@ -65,16 +67,6 @@ std::string switchedToGmt(CalendarDate& date, const CalendarDate::Fields& fields
   appendDateTime(prefix, fields);
   prefix += 'Z';
   return prefix;
-}
-
-bool equalsIgnoringCase(std::string_view text, std::string_view lowerWord) {
-  if (text.size() != lowerWord.size()) return false;
-  for (std::size_t i = 0; i < text.size(); ++i) {
-    char c = text[i];
-    if (c >= 'A' && c <= 'Z') c = static_cast<char>(c - 'A' + 'a');
-    if (c != lowerWord[i]) return false;
-  }
-  return true;
 }
 
 }  // namespace
@@ -160,21 +152,21 @@ std::string iCalendarPropertyValueRepresentation(CalendarDate& date) {
 // --- Recurrence words ---------------------------------------------------------------------
 
 std::string_view iCalendarRepresentationForFrequency(std::string_view word) {
-  if (equalsIgnoringCase(word, "daily")) return "DAILY";
-  if (equalsIgnoringCase(word, "weekly")) return "WEEKLY";
-  if (equalsIgnoringCase(word, "monthly")) return "MONTHLY";
-  if (equalsIgnoringCase(word, "yearly")) return "YEARLY";
+  if (equalsIgnoringAsciiCase(word, "daily")) return "DAILY";
+  if (equalsIgnoringAsciiCase(word, "weekly")) return "WEEKLY";
+  if (equalsIgnoringAsciiCase(word, "monthly")) return "MONTHLY";
+  if (equalsIgnoringAsciiCase(word, "yearly")) return "YEARLY";
   return "ERROR";
 }
 
 std::string_view iCalendarRepresentationForDay(std::string_view name) {
-  if (equalsIgnoringCase(name, "sunday")) return "SU";
-  if (equalsIgnoringCase(name, "monday")) return "MO";
-  if (equalsIgnoringCase(name, "tuesday")) return "TU";
-  if (equalsIgnoringCase(name, "wednesday")) return "WE";
-  if (equalsIgnoringCase(name, "thursday")) return "TH";
-  if (equalsIgnoringCase(name, "friday")) return "FR";
-  if (equalsIgnoringCase(name, "saturday")) return "SA";
+  if (equalsIgnoringAsciiCase(name, "sunday")) return "SU";
+  if (equalsIgnoringAsciiCase(name, "monday")) return "MO";
+  if (equalsIgnoringAsciiCase(name, "tuesday")) return "TU";
+  if (equalsIgnoringAsciiCase(name, "wednesday")) return "WE";
+  if (equalsIgnoringAsciiCase(name, "thursday")) return "TH";
+  if (equalsIgnoringAsciiCase(name, "friday")) return "FR";
+  if (equalsIgnoringAsciiCase(name, "saturday")) return "SA";
   return "ERROR";
 }
 

@@ -8,6 +8,7 @@
 #include "icalendar/calendar_sync_extension.h"
 #include "icalendar/icalendar_export.h"
 #include "icalendar/zeto_calendar_export.h"
+#include "platform/ascii.h"
 #include "platform/calendar_date.h"
 #include "platform/log.h"
 #include "platform/time_zone.h"
@@ -40,19 +41,6 @@ bool isExceptionDatesKey(std::string_view key) {
 bool isStatusKey(std::string_view key) {
   return isAnyOf(key, {tessel::TesselAttribute_Calendars_Event_Status,
                        tessel::TesselAttribute_Calendars_Task_Status});
-}
-
-bool isNone(std::string_view word) {
-  if (word.size() != 4) return false;
-  for (std::size_t i = 0; i < 4; ++i) {
-    const char c = word[i];
-    if (c != "none"[i] && c != "NONE"[i]) return false;
-  }
-  return true;
-}
-
-void appendUpperCased(std::string& out, std::string_view word) {
-  for (char c : word) out += (c >= 'a' && c <= 'z') ? static_cast<char>(c - 'a' + 'A') : c;
 }
 
 // Folds the line that starts at `start` of `out` (RFC 2445 section 4.1, at the device's
@@ -448,10 +436,10 @@ std::optional<std::string> ZetoCalendarExporter::lineForStatus(const Value* valu
 
 bool ZetoCalendarExporter::appendStatus(std::string& out, const Value* value) const {
   const std::string* word = value ? value->asString() : nullptr;
-  if (!word || word->empty() || isNone(*word)) return false;
+  if (!word || word->empty() || platform::equalsIgnoringAsciiCase(*word, "none")) return false;
   const std::size_t start = out.size();
   out += "STATUS:";
-  appendUpperCased(out, *word);
+  out += platform::upperAscii(*word);
   foldFrom(out, start);
   out += "\r\n";
   return true;

@@ -5,60 +5,22 @@
 
 #include "importers/import_error.h"
 #include "importers/physical_lines.h"
+#include "platform/ascii.h"
+#include "platform/utf8.h"
 
 namespace tessel::importers {
 
 namespace {
 
+using zt::platform::trimBlanks;
+using zt::platform::upperAscii;
+
 // Deeper nesting than any real calendar uses (VCALENDAR > VEVENT > VALARM, or VTIMEZONE >
 // STANDARD) is refused before libical, whose parser and destructor recurse, ever sees it.
 constexpr std::size_t kMaximumDepth = 8;
 
-std::string upperCased(std::string_view text) {
-  std::string upper(text);
-  for (char& c : upper) {
-    if (c >= 'a' && c <= 'z') c = static_cast<char>(c - 'a' + 'A');
-  }
-  return upper;
-}
-
-std::string_view trimmed(std::string_view text) {
-  while (!text.empty() && (text.front() == ' ' || text.front() == '\t')) text.remove_prefix(1);
-  while (!text.empty() && (text.back() == ' ' || text.back() == '\t')) text.remove_suffix(1);
-  return text;
-}
-
 bool isNameCharacter(char c) {
   return (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z') || (c >= '0' && c <= '9') || c == '-';
-}
-
-// The length of the UTF-8 sequence that starts at `i`, or 0 when the bytes there are not
-// UTF-8 (overlong forms, surrogates and code points past U+10FFFF included).
-std::size_t utf8SequenceLength(std::string_view text, std::size_t i) {
-  const auto byte = [&](std::size_t k) { return static_cast<unsigned char>(text[k]); };
-  const unsigned char lead = byte(i);
-  if (lead < 0x80) return 1;
-  std::size_t length = 0;
-  unsigned char low = 0x80, high = 0xBF;
-  if (lead >= 0xC2 && lead <= 0xDF) {
-    length = 2;
-  } else if (lead >= 0xE0 && lead <= 0xEF) {
-    length = 3;
-    if (lead == 0xE0) low = 0xA0;
-    if (lead == 0xED) high = 0x9F;
-  } else if (lead >= 0xF0 && lead <= 0xF4) {
-    length = 4;
-    if (lead == 0xF0) low = 0x90;
-    if (lead == 0xF4) high = 0x8F;
-  } else {
-    return 0;
-  }
-  if (i + length > text.size()) return 0;
-  if (byte(i + 1) < low || byte(i + 1) > high) return 0;
-  for (std::size_t k = 2; k < length; ++k) {
-    if (byte(i + k) < 0x80 || byte(i + k) > 0xBF) return 0;
-  }
-  return length;
 }
 
 // Where the value starts: after the first colon that is not inside a quoted parameter value
@@ -117,11 +79,11 @@ std::vector<ICalContentLine> readICalContentLines(std::string_view text,
     // section 3.1 lets a fold fall inside a multi-octet character.
     for (std::size_t i = 0; i < content.size();) {
       if (content[i] == '\0') throw fail(line.number, "a NUL byte is not iCalendar text");
-      const std::size_t length = utf8SequenceLength(content, i);
+      const std::size_t length = zt::platform::utf8::sequenceLength(content, i);
       if (length == 0) throw fail(line.number, "the text is not UTF-8");
       i += length;
     }
-    if (trimmed(content).empty()) continue;
+    if (trimBlanks(content).empty()) continue;
     std::size_t nameEnd = 0;
     while (nameEnd < content.size() && isNameCharacter(content[nameEnd])) ++nameEnd;
     if (nameEnd == 0 || nameEnd == content.size() ||
@@ -130,10 +92,10 @@ std::vector<ICalContentLine> readICalContentLines(std::string_view text,
     }
     const std::optional<std::size_t> value = valueStart(content, nameEnd);
     if (!value) throw fail(line.number, "no ':' before the value");
-    const std::string name = upperCased(content.substr(0, nameEnd));
+    const std::string name = upperAscii(content.substr(0, nameEnd));
 
     if (name == "BEGIN" || name == "END") {
-      const std::string component = upperCased(trimmed(content.substr(*value)));
+      const std::string component = upperAscii(trimBlanks(content.substr(*value)));
       if (component.empty()) throw fail(line.number, name + " names no component");
       if (name == "BEGIN") {
         if (open.empty() && component != "VCALENDAR") {
@@ -164,7 +126,7 @@ std::vector<ICalContentLine> readICalContentLines(std::string_view text,
     if (name == "X-LIC-ERROR") continue;
     // Exporters write empty values ("DESCRIPTION:") for fields the user left blank; they
     // say nothing, and libical would refuse them.
-    if (trimmed(content.substr(*value)).empty()) continue;
+    if (trimBlanks(content.substr(*value)).empty()) continue;
     std::string written(content.substr(0, nameEnd));
     lines.push_back(
         {ICalContentLine::Kind::Property, line.number, std::move(written), std::move(line.text)});

@@ -7,6 +7,7 @@
 #include <memory>
 
 #include "importers/ical_content_lines.h"
+#include "platform/ascii.h"
 
 namespace tessel::importers {
 
@@ -88,11 +89,7 @@ std::string taggedLine(const ICalContentLine& line) {
 }
 
 bool isLineTag(const std::string& name) {
-  std::string upper = name;
-  for (char& c : upper) {
-    if (c >= 'a' && c <= 'z') c = static_cast<char>(c - 'a' + 'A');
-  }
-  return upper == kLineName;
+  return zt::platform::upperAscii(name) == kLineName;
 }
 
 }  // namespace

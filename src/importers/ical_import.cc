@@ -1,15 +1,15 @@
 #include "importers/ical_import.h"
 
 #include <algorithm>
-#include <cerrno>
 #include <cstdint>
-#include <cstring>
 #include <fstream>
 #include <map>
 #include <set>
-#include <sstream>
 #include <system_error>
 
+#include "importers/import_file.h"
+#include "importers/stable_hash.h"
+#include "platform/ascii.h"
 #include "platform/value.h"
 #include "tessel/schema.h"
 
@@ -22,23 +22,6 @@ namespace {
 using zt::platform::Array;
 using zt::platform::Dictionary;
 using zt::platform::Value;
-
-std::string lowerCased(std::string text) {
-  for (char& c : text) {
-    if (c >= 'A' && c <= 'Z') c = static_cast<char>(c - 'A' + 'a');
-  }
-  return text;
-}
-
-std::string readText(const fs::path& path, const std::string& name) {
-  std::ifstream in(path, std::ios::binary);
-  if (!in)
-    throw ImportError(name, std::nullopt, std::string("cannot read: ") + std::strerror(errno));
-  std::ostringstream text;
-  text << in.rdbuf();
-  if (in.bad()) throw ImportError(name, std::nullopt, "cannot read");
-  return std::move(text).str();
-}
 
 // The vdir format keeps a collection's name in a file "displayname" inside the folder.
 std::optional<std::string> vdirDisplayName(const fs::path& folder) {
@@ -61,14 +44,15 @@ ICalCalendarSource folderSource(const fs::path& folder, const std::string& name,
   std::error_code error;
   for (fs::directory_iterator it(folder, error), end; !error && it != end; it.increment(error)) {
     if (!it->is_regular_file(error)) continue;
-    if (lowerCased(it->path().extension().string()) == ".ics") files.push_back(it->path());
+    if (zt::platform::lowerAscii(it->path().extension().string()) == ".ics")
+      files.push_back(it->path());
   }
   if (error) throw ImportError(name, std::nullopt, "cannot list the folder: " + error.message());
   // Folder order is the file system's; file names give a stable one.
   std::sort(files.begin(), files.end());
   for (const fs::path& file : files) {
     const std::string fileName = (fs::path(name) / file.filename()).string();
-    source.files.push_back({fileName, readText(file, fileName)});
+    source.files.push_back({fileName, readImportFile(file, fileName)});
   }
   fs::path named = fs::canonical(folder, error);
   if (error) named = folder;
@@ -81,7 +65,7 @@ ICalCalendarSource fileSource(const fs::path& file, const std::string& name,
                               const std::optional<std::string>& title) {
   ICalCalendarSource source;
   source.identifier = calendarIdentifierForPath(file);
-  source.files.push_back({name, readText(file, name)});
+  source.files.push_back({name, readImportFile(file, name)});
   source.fallbackTitle = title ? *title : file.stem().string();
   return source;
 }
@@ -113,21 +97,102 @@ constexpr std::string_view kOwnedRelationships[] = {
     TesselRelationship_Calendars_Event_DetachedEvents,
 };
 
+// What the store holds now of the calendars an import writes.
+struct StoredCalendars {
+  // The records of each calendar, but for the Calendar record itself.
+  std::map<std::string, RecordMap> records;
+  // The identifiers of every Calendar record.
+  std::set<std::string> live;
+  // The calendars the CalendarOrder record lists.
+  std::vector<std::string> order;
+};
+
+StoredCalendars storedCalendars(const Store& store, const std::vector<ICalCalendar>& calendars) {
+  StoredCalendars stored;
+  for (const ICalCalendar& calendar : calendars) stored.records[calendar.identifier];
+  store.forEachRecord([&](const Record& record) {
+    const Value* entity = record.record.find(TesselRecordEntityNameKey);
+    const std::string* name = entity != nullptr ? entity->asString() : nullptr;
+    if (name != nullptr && *name == TesselEntity_Calendars_Calendar) stored.live.insert(record.id);
+    if (name != nullptr && *name == TesselEntity_Calendars_CalendarOrder && stored.order.empty()) {
+      appendStrings(arrayAt(record.record, TesselRelationship_Calendars_CalendarOrder_Calendars),
+                    stored.order);
+    }
+    const auto found = stored.records.find(calendarOf(record.id));
+    if (found != stored.records.end() && record.id.size() > found->first.size()) {
+      found->second.emplace(record.id, record.record);
+    }
+  });
+  return stored;
+}
+
+// Adds to `records` what one calendar puts, and to `stale` what it deletes of the records the
+// store held of it (`before`).
+void mergeCalendar(const ICalCalendar& calendar, const RecordMap& before, SyncDeletes syncDeletes,
+                   std::vector<Record>& records, std::vector<std::string>& stale) {
+  std::set<std::string> produced;
+  for (const Record& record : calendar.records) produced.insert(record.id);
+
+  std::vector<Record> written = calendar.records;
+  std::set<std::string> kept;
+  if (syncDeletes == SyncDeletes::Off) {
+    // Events and tasks that left the source stay, listed in their calendar as before, and
+    // so do the records they list.
+    std::vector<std::string> keptEvents, keptTasks;
+    for (const auto& [id, record] : before) {
+      const Value* entity = record.find(TesselRecordEntityNameKey);
+      const std::string* name = entity != nullptr ? entity->asString() : nullptr;
+      if (name == nullptr || produced.count(id) != 0) continue;
+      const bool event = *name == TesselEntity_Calendars_Event;
+      if (!event && *name != TesselEntity_Calendars_Task) continue;
+      (event ? keptEvents : keptTasks).push_back(id);
+      kept.insert(id);
+      std::vector<std::string> owned;
+      for (std::string_view key : kOwnedRelationships) appendStrings(arrayAt(record, key), owned);
+      kept.insert(owned.begin(), owned.end());
+    }
+    Dictionary& calendarRecord = written.front().record;
+    const auto extend = [&](std::string_view key, const std::vector<std::string>& ids) {
+      if (ids.empty()) return;
+      Array list = *arrayAt(calendarRecord, key);
+      for (const std::string& id : ids) list.emplace_back(id);
+      calendarRecord.set(key, Value(std::move(list)));
+    };
+    extend(TesselRelationship_Calendars_Calendar_Events, keptEvents);
+    extend(TesselRelationship_Calendars_Calendar_Tasks, keptTasks);
+  }
+  for (const auto& [id, record] : before) {
+    if (produced.count(id) == 0 && kept.count(id) == 0) stale.push_back(id);
+  }
+  for (Record& record : written) records.push_back(std::move(record));
+}
+
+// The order keeps the calendars it lists that still exist, then the new ones.
+std::vector<std::string> calendarOrder(const std::vector<std::string>& order,
+                                       const std::set<std::string>& liveCalendars,
+                                       const std::vector<ICalCalendar>& calendars) {
+  std::vector<std::string> newOrder;
+  for (const std::string& id : order) {
+    if (liveCalendars.count(id) != 0 &&
+        std::find(newOrder.begin(), newOrder.end(), id) == newOrder.end()) {
+      newOrder.push_back(id);
+    }
+  }
+  for (const ICalCalendar& calendar : calendars) {
+    if (std::find(newOrder.begin(), newOrder.end(), calendar.identifier) == newOrder.end()) {
+      newOrder.push_back(calendar.identifier);
+    }
+  }
+  return newOrder;
+}
+
 }  // namespace
 
 std::string calendarIdentifierForPath(const fs::path& path) {
   std::error_code error;
   fs::path absolute = fs::canonical(path, error);
   if (error) absolute = fs::absolute(path, error).lexically_normal();
-  std::uint64_t hash = 0xcbf29ce484222325ULL;  // FNV-1a
-  for (char c : absolute.string()) {
-    hash ^= static_cast<unsigned char>(c);
-    hash *= 0x100000001b3ULL;
-  }
-  static constexpr char kHex[] = "0123456789abcdef";
-  std::string identifier = "ical-0000000000000000";
-  for (std::size_t i = identifier.size(); i-- > 5; hash >>= 4) identifier[i] = kHex[hash & 0xF];
-  return identifier;
+  return "ical-" + stableHash(absolute.string());
 }
 
 std::vector<ICalCalendar> readICalendarPaths(const std::vector<fs::path>& paths,
@@ -155,84 +220,17 @@ std::vector<ICalCalendar> readICalendarPaths(const std::vector<fs::path>& paths,
 
 ICalImportCounts writeICalCalendars(Store& store, const std::vector<ICalCalendar>& calendars,
                                     SyncDeletes syncDeletes) {
-  // What the store holds of these calendars now, by calendar.
-  std::map<std::string, RecordMap> stored;
-  for (const ICalCalendar& calendar : calendars) stored[calendar.identifier];
-  std::set<std::string> liveCalendars;
-  std::vector<std::string> order;
-  store.forEachRecord([&](const Record& record) {
-    const Value* entity = record.record.find(TesselRecordEntityNameKey);
-    const std::string* name = entity != nullptr ? entity->asString() : nullptr;
-    if (name != nullptr && *name == TesselEntity_Calendars_Calendar)
-      liveCalendars.insert(record.id);
-    if (name != nullptr && *name == TesselEntity_Calendars_CalendarOrder && order.empty()) {
-      appendStrings(arrayAt(record.record, TesselRelationship_Calendars_CalendarOrder_Calendars),
-                    order);
-    }
-    const auto found = stored.find(calendarOf(record.id));
-    if (found != stored.end() && record.id.size() > found->first.size()) {
-      found->second.emplace(record.id, record.record);
-    }
-  });
-
+  StoredCalendars stored = storedCalendars(store, calendars);
   std::vector<Record> records;
   std::vector<std::string> stale;
   for (const ICalCalendar& calendar : calendars) {
-    const RecordMap& before = stored[calendar.identifier];
-    std::set<std::string> produced;
-    for (const Record& record : calendar.records) produced.insert(record.id);
-
-    std::vector<Record> written = calendar.records;
-    std::set<std::string> kept;
-    if (syncDeletes == SyncDeletes::Off) {
-      // Events and tasks that left the source stay, listed in their calendar as before, and
-      // so do the records they list.
-      std::vector<std::string> keptEvents, keptTasks;
-      for (const auto& [id, record] : before) {
-        const Value* entity = record.find(TesselRecordEntityNameKey);
-        const std::string* name = entity != nullptr ? entity->asString() : nullptr;
-        if (name == nullptr || produced.count(id) != 0) continue;
-        const bool event = *name == TesselEntity_Calendars_Event;
-        if (!event && *name != TesselEntity_Calendars_Task) continue;
-        (event ? keptEvents : keptTasks).push_back(id);
-        kept.insert(id);
-        std::vector<std::string> owned;
-        for (std::string_view key : kOwnedRelationships) appendStrings(arrayAt(record, key), owned);
-        kept.insert(owned.begin(), owned.end());
-      }
-      Dictionary& calendarRecord = written.front().record;
-      const auto extend = [&](std::string_view key, const std::vector<std::string>& ids) {
-        if (ids.empty()) return;
-        Array list = *arrayAt(calendarRecord, key);
-        for (const std::string& id : ids) list.emplace_back(id);
-        calendarRecord.set(key, Value(std::move(list)));
-      };
-      extend(TesselRelationship_Calendars_Calendar_Events, keptEvents);
-      extend(TesselRelationship_Calendars_Calendar_Tasks, keptTasks);
-    }
-    for (const auto& [id, record] : before) {
-      if (produced.count(id) == 0 && kept.count(id) == 0) stale.push_back(id);
-    }
-    for (Record& record : written) records.push_back(std::move(record));
+    mergeCalendar(calendar, stored.records[calendar.identifier], syncDeletes, records, stale);
   }
-
-  // The order keeps the calendars it lists that still exist, then the new ones.
-  std::vector<std::string> newOrder;
-  for (const ICalCalendar& calendar : calendars) liveCalendars.insert(calendar.identifier);
-  for (const std::string& id : order) {
-    if (liveCalendars.count(id) != 0 &&
-        std::find(newOrder.begin(), newOrder.end(), id) == newOrder.end()) {
-      newOrder.push_back(id);
-    }
-  }
-  for (const ICalCalendar& calendar : calendars) {
-    if (std::find(newOrder.begin(), newOrder.end(), calendar.identifier) == newOrder.end()) {
-      newOrder.push_back(calendar.identifier);
-    }
-  }
+  for (const ICalCalendar& calendar : calendars) stored.live.insert(calendar.identifier);
+  const std::vector<std::string> order = calendarOrder(stored.order, stored.live, calendars);
 
   // One transaction: an interrupted import leaves the store as it was.
-  AppliedChanges applied = store.applyChanges(StoreChanges{records, stale, newOrder});
+  AppliedChanges applied = store.applyChanges(StoreChanges{records, stale, order});
   ICalImportCounts counts;
   counts.written = applied.written;
   counts.deleted = applied.deleted;

@@ -8,6 +8,7 @@
 #include "importers/import_error.h"
 #include "importers/vcard_decoding.h"
 #include "importers/vcard_identifiers.h"
+#include "platform/ascii.h"
 #include "tessel/schema.h"
 
 namespace tessel::importers {
@@ -16,6 +17,9 @@ namespace {
 
 using zt::platform::Data;
 using zt::platform::Dictionary;
+using zt::platform::lowerAscii;
+using zt::platform::startsWithIgnoringAsciiCase;
+using zt::platform::trimBlanks;
 using zt::platform::Url;
 using zt::platform::Value;
 
@@ -68,11 +72,6 @@ std::string joinNonEmpty(const std::vector<std::string>& parts, std::string_view
     out += part;
   }
   return out;
-}
-
-bool startsWithNoCase(std::string_view text, std::string_view lowerCasePrefix) {
-  return text.size() >= lowerCasePrefix.size() &&
-         lowerAscii(text.substr(0, lowerCasePrefix.size())) == lowerCasePrefix;
 }
 
 // The three kinds every e-mail, address and IM record may carry: home, work, other.
@@ -247,7 +246,7 @@ class Converter {
       if (lowerAscii(text(line)) == "group") result_.kind = CardKind::Group;
     } else if (name == "MEMBER" || name == "X-ADDRESSBOOKSERVER-MEMBER") {
       std::string member = text(line);
-      if (startsWithNoCase(member, "urn:uuid:")) member.erase(0, 9);
+      if (startsWithIgnoringAsciiCase(member, "urn:uuid:")) member.erase(0, 9);
       if (!member.empty()) result_.memberUids.push_back(std::move(member));
     }
   }
@@ -258,7 +257,7 @@ class Converter {
 
   void phone(const ContentLine& line, std::string number) {
     // RFC 6350 section 6.4.1: in 4.0 the value may be a tel: URI (RFC 3966).
-    if (startsWithNoCase(number, "tel:")) number.erase(0, 4);
+    if (startsWithIgnoringAsciiCase(number, "tel:")) number.erase(0, 4);
     if (number.empty()) return;
     if (firstPhone_.empty()) firstPhone_ = number;
     addRelated(TesselRelationship_Contacts_Contact_PhoneNumbers, TesselEntity_Contacts_PhoneNumber,
@@ -267,7 +266,7 @@ class Converter {
   }
 
   void email(const ContentLine& line, std::string address) {
-    if (startsWithNoCase(address, "mailto:")) address.erase(0, 7);
+    if (startsWithIgnoringAsciiCase(address, "mailto:")) address.erase(0, 7);
     if (address.empty()) return;
     if (firstEmail_.empty()) firstEmail_ = address;
     Dictionary record{{TesselAttribute_Contacts_EmailAddress_Value, std::move(address)}};
@@ -394,7 +393,7 @@ class Converter {
     try {
       if (encoding == "b" || encoding == "base64") {
         bytes = decodeBase64(line.value);
-      } else if (startsWithNoCase(trimBlanks(line.value), "data:")) {
+      } else if (startsWithIgnoringAsciiCase(trimBlanks(line.value), "data:")) {
         // RFC 2397: data:[<media type>][;base64],<data>
         const std::string_view uri = trimBlanks(line.value);
         const std::size_t comma = uri.find(',');

@@ -5,8 +5,16 @@
 #include <cerrno>
 #include <cstdint>
 #include <stdexcept>
+#include <utility>
+
+#include "platform/ascii.h"
+#include "platform/base64.h"
+#include "platform/utf8.h"
 
 namespace tessel::importers {
+
+using zt::platform::lowerAscii;
+using zt::platform::trimBlanks;
 
 namespace {
 
@@ -15,19 +23,6 @@ int hexDigit(char c) {
   if (c >= 'A' && c <= 'F') return c - 'A' + 10;
   if (c >= 'a' && c <= 'f') return c - 'a' + 10;
   return -1;
-}
-
-int base64Digit(char c) {
-  if (c >= 'A' && c <= 'Z') return c - 'A';
-  if (c >= 'a' && c <= 'z') return c - 'a' + 26;
-  if (c >= '0' && c <= '9') return c - '0' + 52;
-  if (c == '+') return 62;
-  if (c == '/') return 63;
-  return -1;
-}
-
-bool isBlank(char c) {
-  return c == ' ' || c == '\t' || c == '\r' || c == '\n';
 }
 
 // One iconv conversion descriptor, closed however the conversion ends.
@@ -73,39 +68,9 @@ class Converter {
 }  // namespace
 
 zt::platform::Data decodeBase64(std::string_view text) {
-  zt::platform::Data bytes;
-  bytes.reserve(text.size() / 4 * 3);
-  std::uint32_t bits = 0;
-  int count = 0;
-  int padding = 0;
-  for (char c : text) {
-    if (isBlank(c)) continue;
-    if (c == '=') {
-      ++padding;
-      continue;
-    }
-    const int digit = base64Digit(c);
-    if (digit < 0 || padding > 0) throw std::invalid_argument("bad base64");
-    bits = (bits << 6) | static_cast<std::uint32_t>(digit);
-    if (++count == 4) {
-      bytes.push_back(static_cast<std::uint8_t>(bits >> 16));
-      bytes.push_back(static_cast<std::uint8_t>(bits >> 8));
-      bytes.push_back(static_cast<std::uint8_t>(bits));
-      bits = 0;
-      count = 0;
-    }
-  }
-  // A last group of one digit cannot hold a byte; padding must complete the group it ends.
-  if (count == 1 || padding > 2 || (padding > 0 && count + padding != 4)) {
-    throw std::invalid_argument("bad base64");
-  }
-  if (count == 2) {
-    bytes.push_back(static_cast<std::uint8_t>(bits >> 4));
-  } else if (count == 3) {
-    bytes.push_back(static_cast<std::uint8_t>(bits >> 10));
-    bytes.push_back(static_cast<std::uint8_t>(bits >> 2));
-  }
-  return bytes;
+  auto bytes = zt::platform::base64::decode(text, zt::platform::base64::Form::Tolerant);
+  if (!bytes) throw std::invalid_argument("bad base64");
+  return std::move(*bytes);
 }
 
 std::string decodeQuotedPrintable(std::string_view text) {
@@ -143,46 +108,9 @@ std::string decodePercent(std::string_view text) {
   return out;
 }
 
-bool isValidUtf8(std::string_view text) {
-  std::size_t i = 0;
-  while (i < text.size()) {
-    const auto byte = static_cast<unsigned char>(text[i]);
-    std::size_t length = 0;
-    std::uint32_t code = 0;
-    if (byte < 0x80) {
-      ++i;
-      continue;
-    } else if ((byte & 0xE0) == 0xC0) {
-      length = 2;
-      code = byte & 0x1F;
-    } else if ((byte & 0xF0) == 0xE0) {
-      length = 3;
-      code = byte & 0x0F;
-    } else if ((byte & 0xF8) == 0xF0) {
-      length = 4;
-      code = byte & 0x07;
-    } else {
-      return false;
-    }
-    if (i + length > text.size()) return false;
-    for (std::size_t k = 1; k < length; ++k) {
-      const auto next = static_cast<unsigned char>(text[i + k]);
-      if ((next & 0xC0) != 0x80) return false;
-      code = (code << 6) | (next & 0x3F);
-    }
-    // Overlong forms, surrogates and values past U+10FFFF are not UTF-8.
-    static constexpr std::uint32_t kSmallest[] = {0, 0, 0x80, 0x800, 0x10000};
-    if (code < kSmallest[length] || code > 0x10FFFF || (code >= 0xD800 && code <= 0xDFFF)) {
-      return false;
-    }
-    i += length;
-  }
-  return true;
-}
-
 std::string toUtf8(std::string_view bytes, std::optional<std::string_view> charset) {
   if (!charset) {
-    if (isValidUtf8(bytes)) return std::string(bytes);
+    if (zt::platform::utf8::isValid(bytes)) return std::string(bytes);
     Converter converter("WINDOWS-1252");
     // windows-1252 leaves five bytes unassigned; ISO-8859-1 reads every byte.
     if (auto text = converter.convert(bytes)) return *text;
@@ -192,7 +120,8 @@ std::string toUtf8(std::string_view bytes, std::optional<std::string_view> chars
   const std::string name(trimBlanks(*charset));
   const std::string lower = lowerAscii(name);
   if (lower == "utf-8" || lower == "utf8" || lower == "us-ascii" || lower == "ascii") {
-    if (!isValidUtf8(bytes)) throw std::invalid_argument("text is not valid " + name);
+    if (!zt::platform::utf8::isValid(bytes))
+      throw std::invalid_argument("text is not valid " + name);
     return std::string(bytes);
   }
   // iconv also reads names with "//" suffixes as conversion options; a charset is only a name.
@@ -241,20 +170,6 @@ std::string unescapeText(std::string_view raw) {
     ++i;
   }
   return out;
-}
-
-std::string lowerAscii(std::string_view text) {
-  std::string out(text);
-  for (char& c : out) {
-    if (c >= 'A' && c <= 'Z') c = static_cast<char>(c - 'A' + 'a');
-  }
-  return out;
-}
-
-std::string_view trimBlanks(std::string_view text) {
-  while (!text.empty() && (text.front() == ' ' || text.front() == '\t')) text.remove_prefix(1);
-  while (!text.empty() && (text.back() == ' ' || text.back() == '\t')) text.remove_suffix(1);
-  return text;
 }
 
 }  // namespace tessel::importers

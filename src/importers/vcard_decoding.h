@@ -29,7 +29,6 @@ std::string decodePercent(std::string_view text);
 // windows-1252...), the bytes must be valid in it. Without one, UTF-8 is kept and anything
 // else is read as windows-1252, what vCard 2.1 writers without a CHARSET parameter meant.
 std::string toUtf8(std::string_view bytes, std::optional<std::string_view> charset);
-bool isValidUtf8(std::string_view text);
 
 // Splits a raw value at each `separator` not preceded by a backslash; escapes stay.
 std::vector<std::string> splitUnescaped(std::string_view raw, char separator);
@@ -37,10 +36,5 @@ std::vector<std::string> splitUnescaped(std::string_view raw, char separator);
 // RFC 6350 section 3.4 (RFC 2426 section 5 alike): "\n" or "\N" is a line end, "\\", "\,",
 // "\;" the character itself. Other backslashes stay as written (Windows paths in notes).
 std::string unescapeText(std::string_view raw);
-
-// ASCII lower case, for names and parameter values that compare without case.
-std::string lowerAscii(std::string_view text);
-// Without blanks (space, tab) at either end.
-std::string_view trimBlanks(std::string_view text);
 
 }  // namespace tessel::importers

@@ -1,7 +1,8 @@
 #include "importers/vcard_identifiers.h"
 
 #include <cstdint>
-#include <cstdio>
+
+#include "importers/stable_hash.h"
 
 namespace tessel::importers {
 
@@ -29,15 +30,7 @@ std::string contactIdentifierForUid(std::string_view uid) {
 }
 
 std::string contactIdentifierForHash(std::string_view identity) {
-  // FNV-1a: small, stable across builds and machines, and well spread for short texts.
-  std::uint64_t hash = 0xcbf29ce484222325ULL;
-  for (char c : identity) {
-    hash ^= static_cast<unsigned char>(c);
-    hash *= 0x100000001b3ULL;
-  }
-  char hex[17];
-  std::snprintf(hex, sizeof hex, "%016llx", static_cast<unsigned long long>(hash));
-  return std::string(kContactPrefix) + "hash:" + hex;
+  return std::string(kContactPrefix) + "hash:" + stableHash(identity);
 }
 
 std::string groupIdentifier(std::string_view name) {

@@ -1,19 +1,17 @@
 #include "importers/vcard_import.h"
 
 #include <algorithm>
-#include <cerrno>
-#include <cstring>
-#include <fstream>
 #include <set>
-#include <sstream>
 #include <system_error>
 #include <unordered_set>
 #include <utility>
 
 #include "importers/import_error.h"
+#include "importers/import_file.h"
 #include "importers/vcard_decoding.h"
 #include "importers/vcard_identifiers.h"
 #include "importers/vcard_reader.h"
+#include "platform/ascii.h"
 #include "tessel/schema.h"
 
 namespace tessel::importers {
@@ -22,25 +20,10 @@ namespace {
 
 using zt::platform::Array;
 using zt::platform::Dictionary;
+using zt::platform::lowerAscii;
 using zt::platform::Value;
 
 namespace fs = std::filesystem;
-
-std::string readFile(const fs::path& file) {
-  std::error_code error;
-  if (fs::is_directory(file, error)) {
-    throw ImportError(file.string(), std::nullopt, "cannot read: it is a folder");
-  }
-  std::ifstream in(file, std::ios::binary);
-  if (!in) {
-    throw ImportError(file.string(), std::nullopt,
-                      std::string("cannot read: ") + std::strerror(errno));
-  }
-  std::ostringstream text;
-  text << in.rdbuf();
-  if (in.bad()) throw ImportError(file.string(), std::nullopt, "cannot read");
-  return std::move(text).str();
-}
 
 Array identifierArray(const std::vector<std::string>& identifiers) {
   return Array(identifiers.begin(), identifiers.end());
@@ -54,6 +37,74 @@ std::vector<std::string> stringsOf(const Value* value) {
     if (const std::string* text = element.asString()) strings.push_back(*text);
   }
   return strings;
+}
+
+// What earlier imports left in the store that this one does not write again.
+struct EarlierImports {
+  // Their records to delete.
+  std::vector<std::string> deletions;
+  // The members of their groups that stay, by group identifier.
+  std::map<std::string, std::vector<std::string>> groupMembers;
+};
+
+EarlierImports earlierImports(const Store& store, const std::vector<Record>& records,
+                              const std::set<std::string, std::less<>>& importedContacts,
+                              SyncDeletes syncDeletes) {
+  std::unordered_set<std::string> produced;
+  for (const Record& record : records) produced.insert(record.id);
+  EarlierImports earlier;
+  store.forEachRecord([&](const Record& record) {
+    if (!isImportedIdentifier(record.id) || produced.contains(record.id)) {
+      if (record.id.starts_with(kGroupPrefix)) {
+        earlier.groupMembers[record.id] =
+            stringsOf(record.record.find(TesselRelationship_Contacts_Group_Members));
+      }
+      return;
+    }
+    const std::string_view owner = owningContactIdentifier(record.id);
+    // The related records a re-imported contact no longer has are its own garbage.
+    if (syncDeletes == SyncDeletes::On || (!owner.empty() && importedContacts.contains(owner))) {
+      earlier.deletions.push_back(record.id);
+    } else if (record.id.starts_with(kGroupPrefix)) {
+      earlier.groupMembers[record.id] =
+          stringsOf(record.record.find(TesselRelationship_Contacts_Group_Members));
+    }
+  });
+  return earlier;
+}
+
+// A group keeps the contacts of earlier imports that this one did not read again: in the
+// group record this import writes, or in the stored one, written again when it lost members.
+void keepEarlierMembers(const Store& store,
+                        const std::map<std::string, std::vector<std::string>>& earlierMembers,
+                        const std::set<std::string, std::less<>>& importedContacts,
+                        std::vector<Record>& records) {
+  std::map<std::string, std::size_t> groupRecords;
+  for (std::size_t i = 0; i < records.size(); ++i) {
+    if (records[i].id.starts_with(kGroupPrefix)) groupRecords[records[i].id] = i;
+  }
+  for (const auto& [identifier, members] : earlierMembers) {
+    std::vector<std::string> kept;
+    for (const std::string& member : members) {
+      if (!importedContacts.contains(member)) kept.push_back(member);
+    }
+    auto producedGroup = groupRecords.find(identifier);
+    if (producedGroup == groupRecords.end()) {
+      if (kept == members) continue;
+      std::optional<Dictionary> earlier = store.record(identifier);
+      if (!earlier) continue;
+      earlier->set(TesselRelationship_Contacts_Group_Members, identifierArray(kept));
+      records.push_back(Record{identifier, std::move(*earlier)});
+      continue;
+    }
+    Dictionary& group = records[producedGroup->second].record;
+    std::vector<std::string> now = stringsOf(group.find(TesselRelationship_Contacts_Group_Members));
+    for (std::string& member : now) {
+      if (std::find(kept.begin(), kept.end(), member) == kept.end()) kept.push_back(member);
+    }
+    std::sort(kept.begin(), kept.end());
+    group.set(TesselRelationship_Contacts_Group_Members, identifierArray(kept));
+  }
 }
 
 }  // namespace
@@ -81,7 +132,7 @@ void VCardImport::addPaths(const std::vector<fs::path>& paths) {
 }
 
 void VCardImport::addFile(const fs::path& file) {
-  addText(readFile(file), file.string());
+  addText(readImportFile(file, file.string()), file.string());
 }
 
 void VCardImport::addText(std::string_view text, const std::string& source) {
@@ -119,7 +170,7 @@ VCardImport::Groups VCardImport::groups() const {
     for (const std::string& name : contact.groupNames) addMember(name, contact.identifier);
     if (!contact.uid.empty()) {
       std::string uid = contact.uid;
-      if (lowerAscii(uid).starts_with("urn:uuid:")) uid.erase(0, 9);
+      if (zt::platform::startsWithIgnoringAsciiCase(uid, "urn:uuid:")) uid.erase(0, 9);
       contactOfUid.emplace(uid, contact.identifier);
     }
   }
@@ -184,70 +235,21 @@ std::vector<Record> VCardImport::records() const {
 
 VCardImportSummary VCardImport::writeTo(Store& store, SyncDeletes syncDeletes) const {
   std::vector<Record> records = this->records();
-  std::unordered_set<std::string> produced;
-  for (const Record& record : records) produced.insert(record.id);
   std::set<std::string, std::less<>> importedContacts;
   for (const ConvertedCard& contact : contacts_) importedContacts.insert(contact.identifier);
 
-  // What earlier imports left: their identifiers, and their groups' members.
-  std::vector<std::string> deletions;
-  std::map<std::string, std::vector<std::string>> earlierMembers;
-  store.forEachRecord([&](const Record& record) {
-    if (!isImportedIdentifier(record.id) || produced.contains(record.id)) {
-      if (record.id.starts_with(kGroupPrefix)) {
-        earlierMembers[record.id] =
-            stringsOf(record.record.find(TesselRelationship_Contacts_Group_Members));
-      }
-      return;
-    }
-    const std::string_view owner = owningContactIdentifier(record.id);
-    // The related records a re-imported contact no longer has are its own garbage.
-    if (syncDeletes == SyncDeletes::On || (!owner.empty() && importedContacts.contains(owner))) {
-      deletions.push_back(record.id);
-    } else if (record.id.starts_with(kGroupPrefix)) {
-      earlierMembers[record.id] =
-          stringsOf(record.record.find(TesselRelationship_Contacts_Group_Members));
-    }
-  });
-
+  EarlierImports earlier = earlierImports(store, records, importedContacts, syncDeletes);
   if (syncDeletes == SyncDeletes::Off) {
-    // A group keeps the contacts of earlier imports that this one did not read again.
-    std::map<std::string, std::size_t> groupRecords;
-    for (std::size_t i = 0; i < records.size(); ++i) {
-      if (records[i].id.starts_with(kGroupPrefix)) groupRecords[records[i].id] = i;
-    }
-    for (const auto& [identifier, members] : earlierMembers) {
-      std::vector<std::string> kept;
-      for (const std::string& member : members) {
-        if (!importedContacts.contains(member)) kept.push_back(member);
-      }
-      auto producedGroup = groupRecords.find(identifier);
-      if (producedGroup == groupRecords.end()) {
-        if (kept == members) continue;
-        std::optional<Dictionary> earlier = store.record(identifier);
-        if (!earlier) continue;
-        earlier->set(TesselRelationship_Contacts_Group_Members, identifierArray(kept));
-        records.push_back(Record{identifier, std::move(*earlier)});
-        continue;
-      }
-      Dictionary& group = records[producedGroup->second].record;
-      std::vector<std::string> now =
-          stringsOf(group.find(TesselRelationship_Contacts_Group_Members));
-      for (std::string& member : now) {
-        if (std::find(kept.begin(), kept.end(), member) == kept.end()) kept.push_back(member);
-      }
-      std::sort(kept.begin(), kept.end());
-      group.set(TesselRelationship_Contacts_Group_Members, identifierArray(kept));
-    }
+    keepEarlierMembers(store, earlier.groupMembers, importedContacts, records);
   }
 
   VCardImportSummary summary;
   summary.contacts = contactCount();
   summary.groups = groupCount();
   summary.files = files_;
-  // The store writes and deletes in separate transactions; everything that can fail (the
-  // inputs) was checked before the first of them.
-  AppliedChanges applied = store.applyChanges(StoreChanges{records, deletions, std::nullopt});
+  // One transaction: an interrupted import leaves the store as it was.
+  AppliedChanges applied =
+      store.applyChanges(StoreChanges{records, earlier.deletions, std::nullopt});
   summary.written = applied.written;
   summary.deleted = applied.deleted;
   return summary;

@@ -7,21 +7,18 @@
 #include "importers/import_error.h"
 #include "importers/physical_lines.h"
 #include "importers/vcard_decoding.h"
+#include "platform/ascii.h"
 
 namespace tessel::importers {
 
 namespace {
 
+using zt::platform::lowerAscii;
+using zt::platform::trimBlanks;
+using zt::platform::upperAscii;
+
 bool startsWithBlank(std::string_view text) {
   return !text.empty() && (text.front() == ' ' || text.front() == '\t');
-}
-
-std::string upperAscii(std::string_view text) {
-  std::string out(text);
-  for (char& c : out) {
-    if (c >= 'a' && c <= 'z') c = static_cast<char>(c - 'a' + 'A');
-  }
-  return out;
 }
 
 // vCard 2.1 section 2.1.2 allows parameters without a name ("TEL;HOME;VOICE"); their name

@@ -8,6 +8,7 @@
 #include <fstream>
 #include <sstream>
 
+#include "platform/ascii.h"
 #include "platform/log.h"
 
 namespace zt::platform {
@@ -28,14 +29,6 @@ std::string_view withoutComment(std::string_view line) {
   for (std::size_t i = 0; i < line.size(); ++i)
     if (line[i] == '#' && (i == 0 || isBlank(line[i - 1]))) return line.substr(0, i);
   return line;
-}
-
-std::string lowercased(std::string_view text) {
-  std::string result(text);
-  std::transform(result.begin(), result.end(), result.begin(), [](unsigned char c) {
-    return static_cast<char>(c >= 'A' && c <= 'Z' ? c + 32 : c);
-  });
-  return result;
 }
 
 const char* nonEmptyEnvironment(const char* name) {
@@ -99,7 +92,7 @@ UserDefaults UserDefaults::fromText(std::string_view text) {
 std::optional<bool> UserDefaults::boolForKey(std::string_view key) const {
   const auto found = values_.find(key);
   if (found == values_.end()) return std::nullopt;
-  const std::string value = lowercased(found->second);
+  const std::string value = lowerAscii(found->second);
   if (value == "true" || value == "yes" || value == "1") return true;
   if (value == "false" || value == "no" || value == "0") return false;
   Log::debug("User default %@ is not a boolean: %@", key, found->second);

@@ -12,7 +12,7 @@
 
 namespace tessel {
 
-// The typed JSON form of records (schema.md): the text that `tessel records put` reads and
+// The typed JSON form of records: the text that `tessel records put` reads and
 // `tessel records list --json` writes, one record per line:
 //   {"id": "<record id>", "record": {<key>: <value>, ...}}
 // Keys keep their record order both ways. Values that JSON has no kind for are objects with

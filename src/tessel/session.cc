@@ -8,6 +8,7 @@
 #include "tessel/exception.h"
 #include "tessel/filter_registry.h"
 #include "tessel/process_identity.h"
+#include "tessel/pull_decision.h"
 #include "tessel/schema.h"
 #include "tessel/session_outcome_codes.h"
 #include "tessel/session_state.h"
@@ -17,8 +18,12 @@ namespace tessel {
 
 namespace {
 
+using detail::FilterVerdict;
+using detail::PullAction;
+using detail::PullMode;
 using detail::Statement;
 using detail::StatementReset;
+using detail::TruthState;
 
 // Change types of the session's change table. A prune is never offered: it removes from the
 // mirror a record that a replacing session no longer delivers, and counts as accepted.
@@ -44,6 +49,83 @@ std::string placeholders(std::size_t count, int first) {
 
 bool contains(const std::vector<std::string>& names, std::string_view name) {
   return std::find(names.begin(), names.end(), name) != names.end();
+}
+
+std::int64_t storedChange(PullAction action) {
+  switch (action) {
+    case PullAction::Add:
+      return kAdd;
+    case PullAction::Modify:
+      return kModify;
+    case PullAction::Delete:
+      return kDelete;
+    case PullAction::Prune:
+    case PullAction::Nothing:
+      break;
+  }
+  return kPrune;
+}
+
+// The client's filters as the session's view holds them.
+FilterList storedFilters(detail::Connection& connection, const std::string& client) {
+  std::vector<std::pair<std::string, zt::platform::Data>> stored;
+  Statement query(connection,
+                  "SELECT class_name, payload FROM main.client_filters WHERE client_id = ? "
+                  "ORDER BY position");
+  query.bind(1, client);
+  while (query.step()) {
+    auto payload = query.blob(1);
+    stored.emplace_back(std::string(query.text(0)),
+                        zt::platform::Data(payload.begin(), payload.end()));
+  }
+  query.reset();
+  FilterList filters;
+  for (const auto& [className, payload] : stored) {
+    filters.push_back(FilterRegistry::shared().decode(className, payload));
+  }
+  return filters;
+}
+
+// What to do per entity, looked up by name for every record: a handful of entities, so a
+// linear search beats hashing a fresh string per record.
+struct EntityRule {
+  std::string name;
+  std::vector<const Filtering*> judges;
+  PullMode mode;
+};
+
+std::vector<EntityRule> entityRules(const std::vector<std::string>& entities,
+                                    const std::vector<std::string>& entitiesToReplace,
+                                    const FilterList& filters) {
+  std::vector<EntityRule> rules;
+  for (const std::string& entity : entities) {
+    EntityRule rule{
+        entity, {}, contains(entitiesToReplace, entity) ? PullMode::Replace : PullMode::Update};
+    for (const auto& filter : filters) {
+      if (contains(filter->supportedEntityNames(), entity)) rule.judges.push_back(filter.get());
+    }
+    rules.push_back(std::move(rule));
+  }
+  return rules;
+}
+
+FilterVerdict judge(const std::vector<const Filtering*>& judges,
+                    const zt::platform::Dictionary& record, const std::string& identifier) {
+  for (const Filtering* filter : judges) {
+    if (!filter->shouldApplyRecord(record, identifier)) return FilterVerdict::Fails;
+  }
+  return FilterVerdict::Passes;
+}
+
+// A change already committed in this session stays; the others are worked out anew.
+void clearUncommittedChanges(detail::Connection& connection,
+                             const std::vector<std::string>& entities) {
+  Statement clear(connection, "DELETE FROM temp.changes WHERE committed = 0 AND entity IN (" +
+                                  placeholders(entities.size(), 1) + ")");
+  for (std::size_t i = 0; i < entities.size(); ++i) {
+    clear.bind(static_cast<int>(i) + 1, entities[i]);
+  }
+  clear.run();
 }
 
 }  // namespace
@@ -188,39 +270,9 @@ void Session::prepareToPullChanges(const std::vector<std::string>& entityNames) 
   detail::Connection& connection = state_->view->connection();
   const std::string& client = state_->clientIdentifier;
 
-  // The filters as the session's view holds them.
-  FilterList filters;
-  {
-    std::vector<std::pair<std::string, zt::platform::Data>> stored;
-    Statement query(connection,
-                    "SELECT class_name, payload FROM main.client_filters WHERE client_id = ? "
-                    "ORDER BY position");
-    query.bind(1, client);
-    while (query.step()) {
-      auto payload = query.blob(1);
-      stored.emplace_back(std::string(query.text(0)),
-                          zt::platform::Data(payload.begin(), payload.end()));
-    }
-    query.reset();
-    for (const auto& [className, payload] : stored) {
-      filters.push_back(FilterRegistry::shared().decode(className, payload));
-    }
-  }
-  // What to do per entity, looked up by name for every record: a handful of entities, so a
-  // linear search beats hashing a fresh string per record.
-  struct EntityRule {
-    std::string name;
-    std::vector<const Filtering*> judges;
-    bool replace;
-  };
-  std::vector<EntityRule> rules;
-  for (const std::string& entity : entities) {
-    EntityRule rule{entity, {}, contains(state_->entityNamesToReplace, entity)};
-    for (const auto& filter : filters) {
-      if (contains(filter->supportedEntityNames(), entity)) rule.judges.push_back(filter.get());
-    }
-    rules.push_back(std::move(rule));
-  }
+  const FilterList filters = storedFilters(connection, client);
+  const std::vector<EntityRule> rules =
+      entityRules(entities, state_->entityNamesToReplace, filters);
   auto ruleOf = [&](std::string_view entity) -> const EntityRule& {
     for (const EntityRule& rule : rules) {
       if (rule.name == entity) return rule;
@@ -235,22 +287,17 @@ void Session::prepareToPullChanges(const std::vector<std::string>& entityNames) 
       statement.bind(static_cast<int>(i) + 2, entities[i]);
     }
   };
-  {
-    // A change already committed in this session stays; the others are worked out anew.
-    Statement clear(connection, "DELETE FROM temp.changes WHERE committed = 0 AND entity IN (" +
-                                    placeholders(entities.size(), 1) + ")");
-    for (std::size_t i = 0; i < entities.size(); ++i) {
-      clear.bind(static_cast<int>(i) + 1, entities[i]);
-    }
-    clear.run();
-  }
+  clearUncommittedChanges(connection, entities);
   Statement insert(connection,
                    "INSERT OR IGNORE INTO temp.changes(record_id, record_key, entity, type, "
                    "generation, accepted) VALUES (?, ?, ?, ?, ?, ?)");
-  auto add = [&](std::string_view id, std::optional<std::int64_t> key, std::string_view entity,
-                 std::int64_t type, std::int64_t generation) {
+  auto add = [&](std::string_view id, std::int64_t key, std::string_view entity, PullAction action,
+                 std::int64_t generation) {
+    if (action == PullAction::Nothing) return;
+    const std::int64_t type = storedChange(action);
     insert.bind(1, id);
-    if (key) insert.bind(2, *key);
+    // Only what the client receives points at the record in truth.
+    if (type == kAdd || type == kModify) insert.bind(2, key);
     insert.bind(3, entity).bind(4, type).bind(5, generation).bind(6, type == kPrune ? 1 : 0);
     insert.run();
   };
@@ -267,45 +314,19 @@ void Session::prepareToPullChanges(const std::vector<std::string>& entityNames) 
                         inList + ") ORDER BY r.generation");
     bindEntities(truth);
     while (truth.step()) {
-      std::int64_t key = truth.integer(0);
       std::string_view id = truth.text(1);
       std::string_view entity = truth.text(2);
       std::int64_t generation = truth.integer(3);
-      bool deleted = truth.integer(4) != 0;
+      const TruthState state = truth.integer(4) != 0 ? TruthState::Gone : TruthState::Live;
       std::optional<std::int64_t> held;
       if (!truth.isNull(6)) held = truth.integer(6);
       const EntityRule& rule = ruleOf(entity);
-      bool replace = rule.replace;
-      if (deleted) {
-        if (held) add(id, std::nullopt, entity, replace ? kPrune : kDelete, generation);
-        continue;
+      FilterVerdict verdict = FilterVerdict::Passes;
+      if (state == TruthState::Live && !rule.judges.empty()) {
+        verdict = judge(rule.judges, detail::decodeRecord(truth.blob(5)), std::string(id));
       }
-      bool passes = true;
-      if (!rule.judges.empty()) {
-        zt::platform::Dictionary record = detail::decodeRecord(truth.blob(5));
-        std::string identifier(id);
-        for (const Filtering* filter : rule.judges) {
-          if (!filter->shouldApplyRecord(record, identifier)) {
-            passes = false;
-            break;
-          }
-        }
-      }
-      if (replace) {
-        if (passes) {
-          add(id, key, entity, kAdd, generation);
-        } else if (held) {
-          add(id, std::nullopt, entity, kPrune, generation);
-        }
-      } else if (passes) {
-        if (!held) {
-          add(id, key, entity, kAdd, generation);
-        } else if (generation > *held) {
-          add(id, key, entity, kModify, generation);
-        }
-      } else if (held) {
-        add(id, std::nullopt, entity, kDelete, generation);
-      }
+      add(id, truth.integer(0), entity, decidePull(state, generation, held, verdict, rule.mode),
+          generation);
     }
   }
   // Records the client holds that truth never had (or lost without a tombstone).
@@ -319,8 +340,11 @@ void Session::prepareToPullChanges(const std::vector<std::string>& entityNames) 
     bindEntities(orphans);
     while (orphans.step()) {
       std::string_view entity = orphans.text(1);
-      add(orphans.text(0), std::nullopt, entity, ruleOf(entity).replace ? kPrune : kDelete,
-          orphans.integer(2));
+      const std::int64_t generation = orphans.integer(2);
+      add(orphans.text(0), 0, entity,
+          decidePull(TruthState::Gone, generation, generation, FilterVerdict::Passes,
+                     ruleOf(entity).mode),
+          generation);
     }
   }
 }

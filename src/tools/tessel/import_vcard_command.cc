@@ -1,19 +1,11 @@
 #include "tools/tessel/import_vcard_command.h"
 
-#include <cstddef>
 #include <filesystem>
 #include <ostream>
-#include <string_view>
+
+#include "tools/tessel/counted.h"
 
 namespace tessel::cli {
-
-namespace {
-
-std::string counted(std::size_t count, std::string_view one, std::string_view many) {
-  return std::to_string(count) + " " + std::string(count == 1 ? one : many);
-}
-
-}  // namespace
 
 void importVCards(CommandContext& context, const std::vector<std::string>& paths,
                   importers::SyncDeletes syncDeletes) {

@@ -10,6 +10,7 @@
 
 #include "tessel/record_json.h"
 #include "tessel/schema.h"
+#include "tools/tessel/counted.h"
 #include "tools/tessel/record_summary.h"
 
 namespace tessel::cli {
@@ -46,13 +47,13 @@ void putRecords(CommandContext& context, const std::string& file) {
                              e.what());
   }
   const std::size_t written = context.store().putRecords(records);
-  context.out() << records.size() << (records.size() == 1 ? " record" : " records") << " read, "
-                << written << " written\n";
+  context.out() << counted(records.size(), "record", "records") << " read, " << written
+                << " written\n";
 }
 
 void deleteRecords(CommandContext& context, const std::vector<std::string>& identifiers) {
   const std::size_t deleted = context.store().deleteRecords(identifiers, MissingRecords::Fail);
-  context.out() << deleted << (deleted == 1 ? " record" : " records") << " deleted\n";
+  context.out() << counted(deleted, "record", "records") << " deleted\n";
 }
 
 void listRecords(CommandContext& context, const std::optional<std::string>& entityName,
@@ -79,8 +80,8 @@ void listRecords(CommandContext& context, const std::optional<std::string>& enti
 
 void orderCalendars(CommandContext& context, const std::vector<std::string>& calendarIdentifiers) {
   context.store().setCalendarOrder(calendarIdentifiers);
-  context.out() << "calendar order set: " << calendarIdentifiers.size()
-                << (calendarIdentifiers.size() == 1 ? " calendar\n" : " calendars\n");
+  context.out() << "calendar order set: "
+                << counted(calendarIdentifiers.size(), "calendar", "calendars") << '\n';
 }
 
 }  // namespace tessel::cli

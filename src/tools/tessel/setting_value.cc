@@ -5,6 +5,7 @@
 #include <cstdio>
 #include <cstdlib>
 
+#include "platform/iso_wall_clock.h"
 #include "tessel/record_json.h"
 
 namespace tessel::cli {
@@ -46,39 +47,15 @@ bool readChar(std::string_view text, std::size_t& pos, char c) {
   return false;
 }
 
-bool isValidDay(int year, int month, int day) {
-  static constexpr int kDays[] = {31, 28, 31, 30, 31, 30, 31, 31, 30, 31, 30, 31};
-  if (month < 1 || month > 12 || day < 1) return false;
-  const bool leap = (year % 4 == 0 && year % 100 != 0) || year % 400 == 0;
-  return day <= (month == 2 && leap ? 29 : kDays[month - 1]);
-}
-
 std::optional<CalendarDate> parseIsoDate(std::string_view text) {
+  namespace iso = zt::platform::iso;
   std::size_t pos = 0;
-  CalendarDate::Fields f;
-  if (!readDigits(text, pos, 4, f.year) || !readChar(text, pos, '-') ||
-      !readDigits(text, pos, 2, f.month) || !readChar(text, pos, '-') ||
-      !readDigits(text, pos, 2, f.day) || !readChar(text, pos, 'T') ||
-      !readDigits(text, pos, 2, f.hour) || !readChar(text, pos, ':') ||
-      !readDigits(text, pos, 2, f.minute) || !readChar(text, pos, ':') ||
-      !readDigits(text, pos, 2, f.second)) {
-    return std::nullopt;
-  }
-  if (!isValidDay(f.year, f.month, f.day) || f.hour > 23 || f.minute > 59 || f.second > 59) {
-    return std::nullopt;
-  }
-  std::uint32_t nanoseconds = 0;
-  if (readChar(text, pos, '.')) {
-    std::size_t digits = 0;
-    while (pos < text.size() && text[pos] >= '0' && text[pos] <= '9') {
-      if (digits == 9) return std::nullopt;
-      nanoseconds = nanoseconds * 10 + static_cast<std::uint32_t>(text[pos] - '0');
-      ++pos;
-      ++digits;
-    }
-    if (digits == 0) return std::nullopt;
-    for (; digits < 9; ++digits) nanoseconds *= 10;
-  }
+  const std::optional<iso::WallClock> clock =
+      iso::readWallClock(text, pos, iso::YearForm::FourDigits, iso::SecondsForm::Required);
+  if (!clock || iso::firstInvalidField(*clock) != iso::Field::None) return std::nullopt;
+  const CalendarDate::Fields f{static_cast<int>(clock->year),   static_cast<int>(clock->month),
+                               static_cast<int>(clock->day),    static_cast<int>(clock->hour),
+                               static_cast<int>(clock->minute), static_cast<int>(clock->second)};
 
   // The zone designator is required: a setting date is an instant, and the offset written is
   // the zone its fields are read in later ("Z" is GMT, as in the dates the tool stores).
@@ -97,7 +74,7 @@ std::optional<CalendarDate> parseIsoDate(std::string_view text) {
   }
   if (!zone || pos != text.size()) return std::nullopt;
   const CalendarDate date = CalendarDate::fromFields(f, *zone);
-  return CalendarDate(date.instant(), *zone, nanoseconds);
+  return CalendarDate(date.instant(), *zone, clock->nanoseconds);
 }
 
 std::string formatIsoDate(const CalendarDate& date) {
@@ -105,13 +82,7 @@ std::string formatIsoDate(const CalendarDate& date) {
   char buffer[64];
   std::snprintf(buffer, sizeof buffer, "%04d-%02d-%02dT%02d:%02d:%02d", f.year, f.month, f.day,
                 f.hour, f.minute, f.second);
-  std::string out = buffer;
-  if (date.nanoseconds() != 0) {
-    std::snprintf(buffer, sizeof buffer, ".%09u", static_cast<unsigned>(date.nanoseconds()));
-    std::string fraction = buffer;
-    while (fraction.back() == '0') fraction.pop_back();
-    out += fraction;
-  }
+  std::string out = buffer + zt::platform::iso::fraction(date.nanoseconds());
   const std::int32_t offset = date.timeZone().secondsFromGMT(date.instant());
   if (offset == 0) return out + "Z";
   const std::int32_t magnitude = std::abs(offset);

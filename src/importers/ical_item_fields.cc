@@ -1,0 +1,89 @@
+#include "importers/ical_item_fields.h"
+
+#include "importers/ical_properties.h"
+#include "platform/ascii.h"
+
+namespace tessel::importers::ical {
+
+using zt::platform::lowerAscii;
+
+ItemFields readFields(const ComponentReader& reader, icalcomponent* component) {
+  ItemFields fields;
+  icalproperty* duration = nullptr;
+  for (icalproperty* property : propertiesOf(component)) {
+    switch (icalproperty_isa(property)) {
+      case ICAL_SUMMARY_PROPERTY:
+        fields.summary = text(icalproperty_get_summary(property));
+        break;
+      case ICAL_DESCRIPTION_PROPERTY:
+        fields.description = text(icalproperty_get_description(property));
+        break;
+      case ICAL_LOCATION_PROPERTY:
+        fields.location = text(icalproperty_get_location(property));
+        break;
+      case ICAL_STATUS_PROPERTY:
+        // The schema's status words are RFC 5545 section 3.8.1.11's in lower case.
+        fields.status = lowerAscii(valueText(property));
+        break;
+      case ICAL_CLASS_PROPERTY:
+        fields.classification = lowerAscii(valueText(property));
+        break;
+      case ICAL_URL_PROPERTY:
+        fields.url = text(icalproperty_get_url(property));
+        break;
+      case ICAL_PRIORITY_PROPERTY:
+        // 0 is "undefined" (section 3.8.1.9).
+        if (int priority = icalproperty_get_priority(property); priority > 0) {
+          fields.priority = priority;
+        }
+        break;
+      case ICAL_DTSTART_PROPERTY:
+        fields.start = reader.date(property, icalproperty_get_dtstart(property));
+        fields.startProperty = property;
+        break;
+      case ICAL_DTEND_PROPERTY:
+        fields.end = reader.date(property, icalproperty_get_dtend(property));
+        break;
+      case ICAL_DUE_PROPERTY:
+        fields.due = reader.date(property, icalproperty_get_due(property));
+        break;
+      case ICAL_COMPLETED_PROPERTY:
+        fields.completed = reader.date(property, icalproperty_get_completed(property));
+        break;
+      case ICAL_DURATION_PROPERTY:
+        duration = property;
+        break;
+      case ICAL_EXDATE_PROPERTY:
+        fields.exceptionDates.emplace_back(
+            reader.date(property, icalproperty_get_exdate(property)).date);
+        break;
+      case ICAL_RRULE_PROPERTY:
+        fields.rules.push_back(property);
+        break;
+      case ICAL_ORGANIZER_PROPERTY:
+        if (fields.organizer == nullptr) fields.organizer = property;
+        break;
+      case ICAL_ATTENDEE_PROPERTY:
+        fields.attendees.push_back(property);
+        break;
+      default:
+        break;
+    }
+  }
+  const bool task = icalcomponent_isa(component) == ICAL_VTODO_COMPONENT;
+  std::optional<ReadDate>& finish = task ? fields.due : fields.end;
+  if (!finish && fields.start) {
+    if (duration != nullptr) {
+      finish = reader.plus(duration, *fields.start, icalproperty_get_duration(duration));
+    } else if (!task) {
+      // Section 3.6.1: without DTEND or DURATION an event of a DATE lasts that day, one of
+      // a DATE-TIME lasts no time.
+      icaldurationtype day = icaldurationtype_null_duration();
+      day.days = fields.start->wholeDay ? 1 : 0;
+      finish = reader.plus(fields.startProperty, *fields.start, day);
+    }
+  }
+  return fields;
+}
+
+}  // namespace tessel::importers::ical

@@ -1,0 +1,45 @@
+#include "platform/base64.h"
+
+#include <gtest/gtest.h>
+
+#include <string>
+#include <vector>
+
+namespace zt::platform::base64 {
+namespace {
+
+std::string decodedText(std::string_view text, Form form) {
+  const auto bytes = decode(text, form);
+  return bytes ? std::string(bytes->begin(), bytes->end()) : "<none>";
+}
+
+TEST(Base64Decode, ReadsWhatEncodeWrites) {
+  for (const std::string text : {"", "M", "Ma", "Man", "any carnal pleasure."}) {
+    const std::vector<std::uint8_t> bytes(text.begin(), text.end());
+    EXPECT_EQ(decodedText(encode(bytes), Form::Canonical), text);
+    EXPECT_EQ(decodedText(encode(bytes), Form::Tolerant), text);
+  }
+}
+
+TEST(Base64Decode, TheFormsDifferInBlanksPaddingAndUnusedBits) {
+  struct Case {
+    std::string_view text;
+    std::string canonical, tolerant;
+  };
+  const Case cases[] = {
+      {"TWE=", "Ma", "Ma"},
+      {"TWE", "<none>", "Ma"},           // padding left out
+      {"TW\r\n E=", "<none>", "Ma"},     // a folded line
+      {"TWF=", "<none>", "Ma"},          // bits the padding says are unused
+      {"TQ==TQ==", "<none>", "<none>"},  // data after the padding
+      {"T===", "<none>", "<none>"},      // one digit holds no byte
+      {"TW-=", "<none>", "<none>"},      // outside the alphabet
+  };
+  for (const Case& c : cases) {
+    EXPECT_EQ(decodedText(c.text, Form::Canonical), c.canonical) << c.text;
+    EXPECT_EQ(decodedText(c.text, Form::Tolerant), c.tolerant) << c.text;
+  }
+}
+
+}  // namespace
+}  // namespace zt::platform::base64

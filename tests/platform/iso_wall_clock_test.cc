@@ -1,0 +1,61 @@
+#include "platform/iso_wall_clock.h"
+
+#include <gtest/gtest.h>
+
+#include <string>
+
+namespace zt::platform::iso {
+namespace {
+
+// What was read, as "year-month-day hour:minute:second+nanoseconds @end", or the fault.
+std::string reading(std::string_view text, YearForm year, SecondsForm seconds) {
+  std::size_t pos = 0;
+  ReadFault fault{};
+  const auto clock = readWallClock(text, pos, year, seconds, &fault);
+  if (!clock) return fault == ReadFault::Form ? "form" : "long fraction";
+  return std::to_string(clock->year) + "-" + std::to_string(clock->month) + "-" +
+         std::to_string(clock->day) + " " + std::to_string(clock->hour) + ":" +
+         std::to_string(clock->minute) + ":" + std::to_string(clock->second) + "+" +
+         std::to_string(clock->nanoseconds) + " @" + std::to_string(pos);
+}
+
+TEST(IsoWallClock, ReadsTheFieldsAndStopsWhereTheFormEnds) {
+  constexpr auto Four = YearForm::FourDigits;
+  constexpr auto Extended = YearForm::Extended;
+  constexpr auto Required = SecondsForm::Required;
+  constexpr auto Optional = SecondsForm::Optional;
+  struct Case {
+    std::string_view text;
+    YearForm year;
+    SecondsForm seconds;
+    std::string read;
+  };
+  const Case cases[] = {
+      {"2026-11-21T10:05:09Z", Four, Required, "2026-11-21 10:5:9+0 @19"},
+      {"2026-11-21T10:05", Four, Required, "form"},
+      {"2026-11-21T10:05", Extended, Optional, "2026-11-21 10:5:0+0 @16"},
+      {"2026-11-21T10:05:09.5", Four, Required, "2026-11-21 10:5:9+500000000 @21"},
+      {"2026-11-21T10:05:09.123456789", Four, Required, "2026-11-21 10:5:9+123456789 @29"},
+      {"2026-11-21T10:05:09.1234567891", Four, Required, "long fraction"},
+      {"2026-11-21T10:05:09.", Four, Required, "form"},
+      {"-0044-03-15T12:00", Extended, Optional, "-44-3-15 12:0:0+0 @17"},
+      {"-0044-03-15T12:00:00", Four, Required, "form"},
+      {"123456789-01-01T00:00", Extended, Optional, "123456789-1-1 0:0:0+0 @21"},
+      {"20260-11-21T10:05:09", Four, Required, "form"},
+      {"2026-1-21T10:05:09", Four, Required, "form"},
+      {"2026-13-32T25:61:61", Four, Required, "2026-13-32 25:61:61+0 @19"},  // checked later
+  };
+  for (const Case& c : cases) EXPECT_EQ(reading(c.text, c.year, c.seconds), c.read) << c.text;
+}
+
+TEST(IsoWallClock, TheFirstFieldOutOfRangeIsNamed) {
+  EXPECT_EQ(firstInvalidField({2024, 2, 29, 23, 59, 59, 0}), Field::None);
+  EXPECT_EQ(firstInvalidField({2024, 13, 40, 24, 0, 0, 0}), Field::Month);
+  EXPECT_EQ(firstInvalidField({2023, 2, 29, 24, 0, 0, 0}), Field::Day);
+  EXPECT_EQ(firstInvalidField({2023, 2, 28, 24, 60, 0, 0}), Field::Hour);
+  EXPECT_EQ(firstInvalidField({2023, 2, 28, 23, 60, 60, 0}), Field::Minute);
+  EXPECT_EQ(firstInvalidField({2023, 2, 28, 23, 59, 60, 0}), Field::Second);
+}
+
+}  // namespace
+}  // namespace zt::platform::iso
