@@ -50,14 +50,8 @@ platform::Value describedList(const std::vector<std::string>& identifiers) {
 
 // The identifier strings of a relationship; none when the value is not a list.
 std::optional<std::vector<std::string>> identifiersOf(const platform::Value* relationship) {
-  const platform::Array* array = relationship ? relationship->asArray() : nullptr;
-  if (!array) return std::nullopt;
-  std::vector<std::string> identifiers;
-  identifiers.reserve(array->size());
-  for (const platform::Value& element : *array) {
-    if (const std::string* identifier = element.asString()) identifiers.push_back(*identifier);
-  }
-  return identifiers;
+  if (!relationship || !relationship->asArray()) return std::nullopt;
+  return platform::stringsIn(relationship);
 }
 
 }  // namespace

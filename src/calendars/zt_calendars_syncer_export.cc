@@ -42,9 +42,7 @@ std::optional<std::vector<std::uint8_t>> ZTCalendarsSyncer::disassembleDataForCa
       _syncManager.setLastStatus(sync::kStatusEngineFailure);
       return std::nullopt;
     }
-    const platform::Value* titleValue =
-        calendar->find(tessel::TesselAttribute_Calendars_Calendar_Title);
-    const std::string* title = titleValue ? titleValue->asString() : nullptr;
+    const std::string* title = calendar->stringAt(tessel::TesselAttribute_Calendars_Calendar_Title);
     if (!title) {
       Log::debug("Calendar has no name - ignoring this calendar");
       return std::nullopt;

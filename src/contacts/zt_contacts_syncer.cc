@@ -178,16 +178,11 @@ const std::set<std::string>& ZTContactsSyncer::expandedFilteredGroupsIDs() {
           group == groups.end()
               ? nullptr
               : group->second.find(tessel::TesselRelationship_Contacts_Group_Members);
-      if (const platform::Array* list = members ? members->asArray() : nullptr) {
-        for (const platform::Value& member : *list) {
-          const std::string* identifier = member.asString();
-          if (!identifier || !groups.contains(*identifier) || result.contains(*identifier)) {
-            continue;
-          }
-          Log::debug("Adding sub-group with ID %@ to filter", *identifier);
-          result.insert(*identifier);
-          work.push_back(*identifier);
-        }
+      for (const std::string& identifier : platform::stringsIn(members)) {
+        if (!groups.contains(identifier) || result.contains(identifier)) continue;
+        Log::debug("Adding sub-group with ID %@ to filter", identifier);
+        result.insert(identifier);
+        work.push_back(identifier);
       }
       work.pop_front();
     }

@@ -62,15 +62,9 @@ std::vector<std::string> ZetoContactFilter::supportedEntityNames() const {
 bool ZetoContactFilter::shouldApplyRecord(const platform::Dictionary& record,
                                           const std::string& /*identifier*/) const {
   if (_useAllContacts || !contactFilterHelper) return true;
-  const platform::Value* parents =
-      record.find(tessel::TesselRelationship_Contacts_Contact_ParentGroups);
-  const platform::Array* groups = parents ? parents->asArray() : nullptr;
-  if (!groups) return false;
-  for (const platform::Value& group : *groups) {
-    const std::string* identifier = group.asString();
-    if (identifier && contactFilterHelper->shouldApplyContactGroupWithIdentifier(*identifier)) {
-      return true;
-    }
+  for (const std::string& identifier :
+       platform::stringsIn(record.find(tessel::TesselRelationship_Contacts_Contact_ParentGroups))) {
+    if (contactFilterHelper->shouldApplyContactGroupWithIdentifier(identifier)) return true;
   }
   return false;
 }

@@ -112,10 +112,8 @@ ZetoCalendarExporter::ZetoCalendarExporter()
 }
 
 std::string ZetoCalendarExporter::calendarFromRecords(const Dictionary& record) const {
-  const Value* events = record.find(tessel::TesselEntity_Calendars_Event);
-  const Value* tasks = record.find(tessel::TesselEntity_Calendars_Task);
-  const Array* eventArray = events ? events->asArray() : nullptr;
-  const Array* taskArray = tasks ? tasks->asArray() : nullptr;
+  const Array* eventArray = record.arrayAt(tessel::TesselEntity_Calendars_Event);
+  const Array* taskArray = record.arrayAt(tessel::TesselEntity_Calendars_Task);
 
   std::string out;
   out.reserve(1024 +
@@ -177,15 +175,13 @@ std::vector<std::string> ZetoCalendarExporter::timeZoneIdentifiersInCalendar(
   // not looked at here.
   for (std::string_view entity :
        {tessel::TesselEntity_Calendars_Event, tessel::TesselEntity_Calendars_Task}) {
-    const Value* list = record.find(entity);
-    const Array* array = list ? list->asArray() : nullptr;
+    const Array* array = record.arrayAt(entity);
     if (!array) continue;
     for (const Value& element : *array) {
       const Dictionary* fields = element.asDictionary();
       if (!fields) continue;
       for (std::string_view key : kDateKeys) {
-        const Value* value = fields->find(key);
-        const CalendarDate* date = value ? value->asDate() : nullptr;
+        const CalendarDate* date = fields->dateAt(key);
         if (!date) continue;
         const platform::TimeZone& zone = date->timeZone();
         if (isUniversalZone(zone) || zone.isLocal()) continue;
@@ -418,11 +414,10 @@ std::optional<std::string> ZetoCalendarExporter::recurrenceRuleForRecord(
     }
   }
 
-  const Value* freqs = rule.find(tessel::TesselAttribute_Calendars_Recurrence_Bydayfreq);
-  const Value* days = rule.find(tessel::TesselAttribute_Calendars_Recurrence_Bydaydays);
-  if (freqs && days && freqs->asArray() && days->asArray()) {
-    if (std::optional<std::string> byDay =
-            iCalendarRepresentationForByDayFreq(*freqs->asArray(), *days->asArray())) {
+  const Array* freqs = rule.arrayAt(tessel::TesselAttribute_Calendars_Recurrence_Bydayfreq);
+  const Array* days = rule.arrayAt(tessel::TesselAttribute_Calendars_Recurrence_Bydaydays);
+  if (freqs && days) {
+    if (std::optional<std::string> byDay = iCalendarRepresentationForByDayFreq(*freqs, *days)) {
       appendRFC2445Parameter(text, "BYDAY", *byDay);
     }
   }

@@ -65,6 +65,14 @@ class Dictionary {
   const Value* find(std::string_view key) const;
   Value* find(std::string_view key);
   bool contains(std::string_view key) const;
+  // The value of a key when it is of the asked kind; null when the key is missing or holds
+  // another kind. Defined after Value.
+  const std::string* stringAt(std::string_view key) const;
+  const Number* numberAt(std::string_view key) const;
+  const CalendarDate* dateAt(std::string_view key) const;
+  const Data* dataAt(std::string_view key) const;
+  const Array* arrayAt(std::string_view key) const;
+  const Dictionary* dictionaryAt(std::string_view key) const;
   // Replaces the value of an existing key in place, or appends the key at the end.
   void set(std::string_view key, Value value);
   bool erase(std::string_view key);
@@ -131,8 +139,37 @@ class Value {
   std::variant<std::string, Number, CalendarDate, Url, Data, Array, Dictionary> v_;
 };
 
+// The strings of a list value, such as the identifiers a relationship holds, in order;
+// elements of another kind are skipped, and anything but a list holds none.
+std::vector<std::string> stringsIn(const Array& list);
+std::vector<std::string> stringsIn(const Value* list);
+
 inline bool Dictionary::contains(std::string_view key) const {
   return find(key) != nullptr;
+}
+inline const std::string* Dictionary::stringAt(std::string_view key) const {
+  const Value* value = find(key);
+  return value ? value->asString() : nullptr;
+}
+inline const Number* Dictionary::numberAt(std::string_view key) const {
+  const Value* value = find(key);
+  return value ? value->asNumber() : nullptr;
+}
+inline const CalendarDate* Dictionary::dateAt(std::string_view key) const {
+  const Value* value = find(key);
+  return value ? value->asDate() : nullptr;
+}
+inline const Data* Dictionary::dataAt(std::string_view key) const {
+  const Value* value = find(key);
+  return value ? value->asData() : nullptr;
+}
+inline const Array* Dictionary::arrayAt(std::string_view key) const {
+  const Value* value = find(key);
+  return value ? value->asArray() : nullptr;
+}
+inline const Dictionary* Dictionary::dictionaryAt(std::string_view key) const {
+  const Value* value = find(key);
+  return value ? value->asDictionary() : nullptr;
 }
 inline std::size_t Dictionary::size() const {
   return entries_.size();
