@@ -9,6 +9,7 @@
 
 #include "calendars/record_description.h"
 #include "platform/log.h"
+#include "platform/sync_progress.h"
 #include "sync/sync_status.h"
 #include "sync/zt_sync_manager.h"
 #include "tessel/change.h"
@@ -23,7 +24,7 @@ using platform::Log;
 
 namespace {
 
-const std::string kUploadingPhase = "TesselClientUploadingPhase";
+using platform::sync_progress::kUploadingPhase;
 constexpr float kProgressAfterCleaning = 34.0f;
 
 // Raised when the engine offers something other than an add: calendars are replaced

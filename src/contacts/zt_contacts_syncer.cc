@@ -3,6 +3,7 @@
 #include <deque>
 
 #include "platform/log.h"
+#include "platform/sync_progress.h"
 #include "sync/sync_status.h"
 #include "sync/zt_sync_manager.h"
 #include "tessel/exception.h"
@@ -14,7 +15,7 @@ using platform::Log;
 
 namespace {
 
-const std::string kUploadingPhase = "TesselClientUploadingPhase";
+using platform::sync_progress::kUploadingPhase;
 
 // A set as log lines print it: "{(a, b)}".
 std::string describe(const std::set<std::string>& identifiers) {
