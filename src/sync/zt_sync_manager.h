@@ -21,7 +21,8 @@ namespace zt::sync {
 // The spine of one sync: one instance per process, made with the sync client identifier and
 // asked once to doSync. It owns the engine client, session and snapshot, the player's
 // reference, lock and paths, the per-data-class decisions and the outcome status, and posts
-// the progress notifications. The syncers call back into it for all of these.
+// the progress notifications. The syncers, made through the makers it is given, use it for
+// all of these.
 class ZTSyncManager {
  public:
   ZTSyncManager(std::string syncClientID, SyncServices services);
