@@ -88,6 +88,9 @@ class Dictionary {
   bool operator==(const Dictionary& other) const;
 
  private:
+  template <typename T>
+  const T* kindAt(std::string_view key, const T* (Value::*as)() const) const;
+
   std::vector<Entry> entries_;
 };
 
@@ -147,29 +150,28 @@ std::vector<std::string> stringsIn(const Value* list);
 inline bool Dictionary::contains(std::string_view key) const {
   return find(key) != nullptr;
 }
-inline const std::string* Dictionary::stringAt(std::string_view key) const {
+template <typename T>
+const T* Dictionary::kindAt(std::string_view key, const T* (Value::*as)() const) const {
   const Value* value = find(key);
-  return value ? value->asString() : nullptr;
+  return value ? (value->*as)() : nullptr;
+}
+inline const std::string* Dictionary::stringAt(std::string_view key) const {
+  return kindAt(key, &Value::asString);
 }
 inline const Number* Dictionary::numberAt(std::string_view key) const {
-  const Value* value = find(key);
-  return value ? value->asNumber() : nullptr;
+  return kindAt(key, &Value::asNumber);
 }
 inline const CalendarDate* Dictionary::dateAt(std::string_view key) const {
-  const Value* value = find(key);
-  return value ? value->asDate() : nullptr;
+  return kindAt(key, &Value::asDate);
 }
 inline const Data* Dictionary::dataAt(std::string_view key) const {
-  const Value* value = find(key);
-  return value ? value->asData() : nullptr;
+  return kindAt(key, &Value::asData);
 }
 inline const Array* Dictionary::arrayAt(std::string_view key) const {
-  const Value* value = find(key);
-  return value ? value->asArray() : nullptr;
+  return kindAt(key, &Value::asArray);
 }
 inline const Dictionary* Dictionary::dictionaryAt(std::string_view key) const {
-  const Value* value = find(key);
-  return value ? value->asDictionary() : nullptr;
+  return kindAt(key, &Value::asDictionary);
 }
 inline std::size_t Dictionary::size() const {
   return entries_.size();
