@@ -151,8 +151,7 @@ bool ZTCalendarsSyncer::getChanges() {
     _allCalsAsData.clear();
     return true;
   } catch (const tessel::Exception& exception) {
-    Log::debug("Exception while getting changes:\n%@", exception);
-    _syncManager.setLastStatusForException(exception);
+    _syncManager.reportEngineException("getting changes", exception);
     return false;
   }
 }

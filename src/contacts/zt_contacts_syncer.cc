@@ -102,8 +102,7 @@ bool ZTContactsSyncer::getChanges() {
     }
     return true;
   } catch (const tessel::Exception& exception) {
-    Log::debug("Exception while getting changes:\n%@", exception);
-    _syncManager.setLastStatusForException(exception);
+    _syncManager.reportEngineException("getting changes", exception);
     return false;
   }
 }

@@ -56,8 +56,7 @@ bool ZTContactsSyncer::disassembleData() {
     Log::debug("Effectively stored %ul contacts on Zeto", written);
     return true;
   } catch (const tessel::Exception& exception) {
-    Log::debug("Exception while getting changes:\n%@", exception);
-    _syncManager.setLastStatusForException(exception);
+    _syncManager.reportEngineException("getting changes", exception);
     return false;
   }
 }

@@ -111,8 +111,7 @@ bool ZTSyncManager::doCoreSync() {
     _syncSession->prepareToPullChanges(_entitiesToSync);
     return true;
   } catch (const tessel::Exception& exception) {
-    Log::debug("Exception while preparing to pull changes from sync server:\n%@", exception);
-    setLastStatusForException(exception);
+    reportEngineException("preparing to pull changes from sync server", exception);
     return false;
   }
 }

@@ -4,6 +4,7 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "platform/device_library.h"
@@ -87,6 +88,9 @@ class ZTSyncManager {
   }
   void setLastUsedSyncToolWasDifferentIsCached(bool cached);
   void setLastStatusForException(const tessel::Exception& exception);
+  // How every step reports an engine exception it stops on: a debug line "Exception while
+  // <doing>:" with the exception, and the status the exception stands for.
+  void reportEngineException(std::string_view doing, const tessel::Exception& exception);
   void setLastStatus(std::int32_t status) { _lastStatus = status; }
   std::int32_t lastStatus() const { return _lastStatus; }
   bool shouldSyncContacts() const { return _shouldSyncContacts; }
