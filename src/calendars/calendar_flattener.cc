@@ -137,18 +137,6 @@ void copyKeys(const Dictionary& source, Dictionary& destination, KeyList keys) {
   }
 }
 
-// The identifier strings of a relationship value; anything but an array of strings holds none.
-std::vector<std::string> identifiersOf(const Value* relationship) {
-  std::vector<std::string> identifiers;
-  const Array* array = relationship ? relationship->asArray() : nullptr;
-  if (!array) return identifiers;
-  identifiers.reserve(array->size());
-  for (const Value& element : *array) {
-    if (const std::string* identifier = element.asString()) identifiers.push_back(*identifier);
-  }
-  return identifiers;
-}
-
 const Array& emptyArray() {
   static const Array empty;
   return empty;
@@ -194,12 +182,7 @@ bool CalendarFlattener::appendCalSubEntities(const Array& identifiers, KeyList f
   if (identifiers.empty()) return true;
   // The key is there even when none of the records can be found.
   filteredRecord.set(icalKey, Array{});
-  std::vector<std::string> wanted;
-  wanted.reserve(identifiers.size());
-  for (const Value& element : identifiers) {
-    if (const std::string* identifier = element.asString()) wanted.push_back(*identifier);
-  }
-  tessel::RecordMap records = snapshot_.recordsWithIdentifiers(wanted);
+  tessel::RecordMap records = snapshot_.recordsWithIdentifiers(platform::stringsIn(identifiers));
   Array flattened;
   flattened.reserve(records.size());
   for (const auto& [identifier, record] : records) {
@@ -214,8 +197,7 @@ bool CalendarFlattener::appendCalSubEntities(const Array& identifiers, KeyList f
 bool CalendarFlattener::appendCalEntity(const Dictionary& record, Array* eventArray,
                                         Array* taskArray,
                                         const tessel::RecordMap& allEntities) const {
-  const Value* entityValue = record.find(TesselRecordEntityNameKey);
-  const std::string* entity = entityValue ? entityValue->asString() : nullptr;
+  const std::string* entity = record.stringAt(TesselRecordEntityNameKey);
   if (!entity) {
     Log::debug("No entity type for calendar record:\n%@", RecordDescription{record});
     return true;
@@ -235,12 +217,12 @@ bool CalendarFlattener::appendCalEntity(const Dictionary& record, Array* eventAr
     }
 
     std::vector<std::string> detached =
-        identifiersOf(record.find(TesselRelationship_Calendars_Event_DetachedEvents));
+        platform::stringsIn(record.find(TesselRelationship_Calendars_Event_DetachedEvents));
     if (!detached.empty()) {
       // A detached occurrence replaces one instance of the rule, so the rule must skip it.
       Array exceptionDates;
-      if (const Value* copied = event.find(TesselAttribute_Calendars_Event_ExceptionDates)) {
-        if (const Array* dates = copied->asArray()) exceptionDates = *dates;
+      if (const Array* dates = event.arrayAt(TesselAttribute_Calendars_Event_ExceptionDates)) {
+        exceptionDates = *dates;
       }
       for (const std::string& identifier : detached) {
         auto occurrence = allEntities.find(identifier);
@@ -281,11 +263,11 @@ std::optional<Dictionary> CalendarFlattener::flattenCalendar(const Dictionary& c
   std::optional<Array> tasks;
   std::vector<std::string> members;
   if (eventsValue) {
-    members = identifiersOf(eventsValue);
+    members = platform::stringsIn(eventsValue);
     events.emplace();
   }
   if (tasksValue) {
-    std::vector<std::string> taskIDs = identifiersOf(tasksValue);
+    std::vector<std::string> taskIDs = platform::stringsIn(tasksValue);
     members.insert(members.end(), std::make_move_iterator(taskIDs.begin()),
                    std::make_move_iterator(taskIDs.end()));
     tasks.emplace();

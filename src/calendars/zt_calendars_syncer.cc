@@ -9,6 +9,7 @@
 
 #include "calendars/record_description.h"
 #include "platform/log.h"
+#include "platform/sync_progress.h"
 #include "sync/sync_status.h"
 #include "sync/zt_sync_manager.h"
 #include "tessel/change.h"
@@ -23,7 +24,7 @@ using platform::Log;
 
 namespace {
 
-const std::string kUploadingPhase = "TesselClientUploadingPhase";
+using platform::sync_progress::kUploadingPhase;
 constexpr float kProgressAfterCleaning = 34.0f;
 
 // Raised when the engine offers something other than an add: calendars are replaced
@@ -50,14 +51,8 @@ platform::Value describedList(const std::vector<std::string>& identifiers) {
 
 // The identifier strings of a relationship; none when the value is not a list.
 std::optional<std::vector<std::string>> identifiersOf(const platform::Value* relationship) {
-  const platform::Array* array = relationship ? relationship->asArray() : nullptr;
-  if (!array) return std::nullopt;
-  std::vector<std::string> identifiers;
-  identifiers.reserve(array->size());
-  for (const platform::Value& element : *array) {
-    if (const std::string* identifier = element.asString()) identifiers.push_back(*identifier);
-  }
-  return identifiers;
+  if (!relationship || !relationship->asArray()) return std::nullopt;
+  return platform::stringsIn(relationship);
 }
 
 }  // namespace
@@ -156,8 +151,7 @@ bool ZTCalendarsSyncer::getChanges() {
     _allCalsAsData.clear();
     return true;
   } catch (const tessel::Exception& exception) {
-    Log::debug("Exception while getting changes:\n%@", exception);
-    _syncManager.setLastStatusForException(exception);
+    _syncManager.reportEngineException("getting changes", exception);
     return false;
   }
 }

@@ -15,8 +15,7 @@ namespace {
 
 // The text of a name attribute as log lines print it, "(null)" when there is none.
 std::string nameText(const platform::Dictionary& contact, std::string_view key) {
-  const platform::Value* value = contact.find(key);
-  const std::string* text = value ? value->asString() : nullptr;
+  const std::string* text = contact.stringAt(key);
   return text ? *text : "(null)";
 }
 
@@ -55,8 +54,7 @@ platform::ImageService* ContactPhotoPreparation::imageService() {
 
 std::optional<platform::Data> ContactPhotoPreparation::photoForContact(
     const platform::Dictionary& contact) {
-  const platform::Value* value = contact.find(tessel::TesselAttribute_Contacts_Contact_Image);
-  const platform::Data* picture = value ? value->asData() : nullptr;
+  const platform::Data* picture = contact.dataAt(tessel::TesselAttribute_Contacts_Contact_Image);
   if (!picture || picture->empty()) return std::nullopt;
   if (picture->size() == 1) {
     Log::debug("Image for %@ is invalid (less than 2 bytes!)",

@@ -162,14 +162,8 @@ void VCardWriter::appendRelated(std::string& card, const platform::Dictionary& c
   // Every list the contact holds names related records, its groups included; a record
   // linked twice is written once.
   std::unordered_set<std::string> visited;
-  std::vector<std::string> identifiers;
   for (const auto& [key, value] : contact) {
-    const platform::Array* list = value.asArray();
-    if (!list || list->empty()) continue;
-    identifiers.clear();
-    for (const platform::Value& element : *list) {
-      if (const std::string* identifier = element.asString()) identifiers.push_back(*identifier);
-    }
+    const std::vector<std::string> identifiers = platform::stringsIn(&value);
     if (identifiers.empty()) continue;
     for (const auto& [identifier, record] : snapshot_.recordsWithIdentifiers(identifiers)) {
       if (!visited.insert(identifier).second) continue;

@@ -3,6 +3,7 @@
 #include <deque>
 
 #include "platform/log.h"
+#include "platform/sync_progress.h"
 #include "sync/sync_status.h"
 #include "sync/zt_sync_manager.h"
 #include "tessel/exception.h"
@@ -14,7 +15,7 @@ using platform::Log;
 
 namespace {
 
-const std::string kUploadingPhase = "TesselClientUploadingPhase";
+using platform::sync_progress::kUploadingPhase;
 
 // A set as log lines print it: "{(a, b)}".
 std::string describe(const std::set<std::string>& identifiers) {
@@ -101,8 +102,7 @@ bool ZTContactsSyncer::getChanges() {
     }
     return true;
   } catch (const tessel::Exception& exception) {
-    Log::debug("Exception while getting changes:\n%@", exception);
-    _syncManager.setLastStatusForException(exception);
+    _syncManager.reportEngineException("getting changes", exception);
     return false;
   }
 }
@@ -178,16 +178,11 @@ const std::set<std::string>& ZTContactsSyncer::expandedFilteredGroupsIDs() {
           group == groups.end()
               ? nullptr
               : group->second.find(tessel::TesselRelationship_Contacts_Group_Members);
-      if (const platform::Array* list = members ? members->asArray() : nullptr) {
-        for (const platform::Value& member : *list) {
-          const std::string* identifier = member.asString();
-          if (!identifier || !groups.contains(*identifier) || result.contains(*identifier)) {
-            continue;
-          }
-          Log::debug("Adding sub-group with ID %@ to filter", *identifier);
-          result.insert(*identifier);
-          work.push_back(*identifier);
-        }
+      for (const std::string& identifier : platform::stringsIn(members)) {
+        if (!groups.contains(identifier) || result.contains(identifier)) continue;
+        Log::debug("Adding sub-group with ID %@ to filter", identifier);
+        result.insert(identifier);
+        work.push_back(identifier);
       }
       work.pop_front();
     }

@@ -1,7 +1,6 @@
 #include "device/contact_pictures.h"
 
 #include <optional>
-#include <variant>
 
 #include "device/checkpoint_data.h"
 #include "device/driver_entry_lookup.h"
@@ -30,12 +29,12 @@ class CrypticLogs {
 }  // namespace
 
 bool checkpointSupportsContactPictures(std::span<const std::uint8_t> document) {
-  std::variant<platform::Value, std::string> parsed = platform::parsePropertyList(document);
-  if (const std::string* error = std::get_if<std::string>(&parsed)) {
-    Log::debug("Can't parse XML checkpoint data: %@", *error);
+  platform::Result<platform::Value> parsed = platform::parsePropertyList(document);
+  if (!parsed) {
+    Log::debug("Can't parse XML checkpoint data: %@", parsed.error());
     return false;
   }
-  const platform::Value& root = std::get<platform::Value>(parsed);
+  const platform::Value& root = *parsed;
   const platform::Dictionary* dictionary = root.asDictionary();
   if (!dictionary) {
     Log::debug("Checkpoint data was not a dictionary property list. It is a %@", root.typeName());

@@ -5,9 +5,8 @@
 #include <vector>
 
 #include "filters/filter_helpers.h"
-#include "tessel/coder.h"
+#include "filters/selection_filter.h"
 #include "tessel/decoder.h"
-#include "tessel/filtering.h"
 #include "tessel/snapshot.h"
 
 namespace zt::filters {
@@ -15,7 +14,7 @@ namespace zt::filters {
 // The user's choice of contacts for one player: all of them, or the members of some groups.
 // Stored with the sync client; the engine asks it record by record during a sync, and it
 // defers to the contacts syncer registered as its helper.
-class ZetoContactFilter final : public tessel::Filtering {
+class ZetoContactFilter final : public SelectionFilter {
  public:
   static constexpr std::string_view kClassName = "ZetoContactFilter";
 
@@ -28,28 +27,21 @@ class ZetoContactFilter final : public tessel::Filtering {
   // The process-wide helper, not owned; none lets every record through.
   static void setContactFilterHelper(ContactFilterHelper* helper);
 
-  bool useAllContacts() const { return _useAllContacts; }
-  void setUseAllContacts(bool useAll);
-  const tessel::CodedElements& usedContactGroups() const { return _usedContactGroups; }
-  std::vector<std::string> usedContactGroupIDsForSnapshot(const tessel::Snapshot& snapshot) const;
-  void setUsedContactGroups(const tessel::CodedElements& groups);
+  bool useAllContacts() const { return useAll(); }
+  void setUseAllContacts(bool useAll) { setUseAll(useAll); }
+  const tessel::CodedElements& usedContactGroups() const { return selection(); }
+  std::vector<std::string> usedContactGroupIDsForSnapshot(const tessel::Snapshot& snapshot) const {
+    return selectedIDsForSnapshot(snapshot);
+  }
+  void setUsedContactGroups(const tessel::CodedElements& groups) { setSelection(groups); }
   void setUsedContactGroupIDs(const std::vector<std::string>& identifiers,
-                              const tessel::Snapshot& snapshot);
-  bool needsUpdate() const { return _needsUpdate; }
-  void setNeedsUpdate(bool needsUpdate) { _needsUpdate = needsUpdate; }
+                              const tessel::Snapshot& snapshot) {
+    setSelectedIDs(identifiers, snapshot);
+  }
 
-  std::string className() const override { return std::string(kClassName); }
-  std::vector<std::string> supportedEntityNames() const override;
   bool shouldApplyRecord(const platform::Dictionary& record,
                          const std::string& identifier) const override;
   bool isEqual(const tessel::Filtering& other) const override;
-  void encode(tessel::Coder& coder) const override;
-  std::string description() const override;
-
- private:
-  bool _needsUpdate = false;
-  bool _useAllContacts = true;
-  tessel::CodedElements _usedContactGroups;
 };
 
 }  // namespace zt::filters

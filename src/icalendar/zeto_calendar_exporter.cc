@@ -52,6 +52,15 @@ void foldFrom(std::string& out, std::size_t start) {
   out += fold(line);
 }
 
+// One folded property line, CR LF ended: the property's name and the rest of the line.
+void appendFoldedLine(std::string& out, std::string_view name, std::string_view rest) {
+  const std::size_t start = out.size();
+  out += name;
+  out += rest;
+  foldFrom(out, start);
+  out += "\r\n";
+}
+
 // Title and order are written as they stand.
 void appendPlainText(std::string& out, const Value& value) {
   if (const std::string* text = value.asString()) {
@@ -100,10 +109,8 @@ ZetoCalendarExporter::ZetoCalendarExporter()
 }
 
 std::string ZetoCalendarExporter::calendarFromRecords(const Dictionary& record) const {
-  const Value* events = record.find(tessel::TesselEntity_Calendars_Event);
-  const Value* tasks = record.find(tessel::TesselEntity_Calendars_Task);
-  const Array* eventArray = events ? events->asArray() : nullptr;
-  const Array* taskArray = tasks ? tasks->asArray() : nullptr;
+  const Array* eventArray = record.arrayAt(tessel::TesselEntity_Calendars_Event);
+  const Array* taskArray = record.arrayAt(tessel::TesselEntity_Calendars_Task);
 
   std::string out;
   out.reserve(1024 +
@@ -165,15 +172,13 @@ std::vector<std::string> ZetoCalendarExporter::timeZoneIdentifiersInCalendar(
   // not looked at here.
   for (std::string_view entity :
        {tessel::TesselEntity_Calendars_Event, tessel::TesselEntity_Calendars_Task}) {
-    const Value* list = record.find(entity);
-    const Array* array = list ? list->asArray() : nullptr;
+    const Array* array = record.arrayAt(entity);
     if (!array) continue;
     for (const Value& element : *array) {
       const Dictionary* fields = element.asDictionary();
       if (!fields) continue;
       for (std::string_view key : kDateKeys) {
-        const Value* value = fields->find(key);
-        const CalendarDate* date = value ? value->asDate() : nullptr;
+        const CalendarDate* date = fields->dateAt(key);
         if (!date) continue;
         const platform::TimeZone& zone = date->timeZone();
         if (isUniversalZone(zone) || zone.isLocal()) continue;
@@ -206,97 +211,82 @@ std::optional<std::string> ZetoCalendarExporter::propertyForKey(std::string_view
 bool ZetoCalendarExporter::appendPropertyForKey(std::string& out, std::string_view key,
                                                 std::string_view entity, const Value* value) const {
   if (!value) return false;
-
   if (std::optional<std::string_view> property = mappingForSyncKey(key, entity)) {
-    if (const CalendarDate* date = value->asDate()) {
-      // Writing a date may switch it to GMT; the record stays as the caller gave it.
-      CalendarDate copy = *date;
-      appendDatePropertyLine(out, *property, copy);
-      return true;
-    }
-    const std::size_t start = out.size();
-    out += *property;
-    out += ':';
-    if (const std::string* text = value->asString()) {
-      out += iCalendarEscapeValue(*text);
-    } else {
-      out += iCalendarEscapeValue(iCalendarRepresentation(*value));
-    }
-    foldFrom(out, start);
-    out += "\r\n";
+    appendMappedProperty(out, *property, *value);
     return true;
   }
-
   if (isExceptionDatesKey(key)) {
-    if (const Array* dates = value->asArray()) {
-      appendExceptionDates(out, *dates);
-      return true;
-    }
-    return false;
+    const Array* dates = value->asArray();
+    if (dates) appendExceptionDates(out, *dates);
+    return dates != nullptr;
   }
-
   if (isStatusKey(key)) return appendStatus(out, value);
+  if (key == tessel::TesselEntity_Calendars_Organizer) return appendOrganizer(out, *value);
 
-  if (key == tessel::TesselEntity_Calendars_Organizer) {
-    std::optional<std::string> address;
-    if (const Dictionary* organizer = value->asDictionary()) {
-      address = addressForRecord(*organizer);
-    } else if (const Array* organizers = value->asArray()) {
-      // The flattened record lists the organizer like any related record; an empty list
-      // is a broken record, and the export of the whole calendar is abandoned.
-      if (organizers->empty()) throw std::out_of_range("organizer array is empty");
-      address = addressForRecord(recordOrEmpty(organizers->front()));
-    }
-    if (!address) {
-      platform::Log::standardError("Organizer translation error");
-      return false;
-    }
-    const std::size_t start = out.size();
-    out += "ORGANIZER";
-    out += *address;
-    foldFrom(out, start);
-    out += "\r\n";
-    return true;
-  }
-
+  // The remaining keys hold lists of related records, and an empty list gives nothing.
   const Array* records = nonEmptyArray(*value);
   if (!records) return false;
-
   if (isAlarmKey(key)) {
     for (const Value& alarm : *records) appendAlarm(out, recordOrEmpty(alarm));
     return true;
   }
-
   if (key == tessel::TesselEntity_Calendars_Attendee) {
-    for (const Value& attendee : *records) {
-      std::optional<std::string> address = addressForRecord(recordOrEmpty(attendee));
-      if (!address) continue;
-      const std::size_t start = out.size();
-      out += "ATTENDEE";
-      out += *address;
-      foldFrom(out, start);
-      out += "\r\n";
-    }
+    appendAttendees(out, *records);
     return true;
   }
-
-  if (key == tessel::TesselEntity_Calendars_Recurrence) {
-    // The device follows one rule per event; further rules are dropped.
-    const Dictionary* first = records->front().asDictionary();
-    std::optional<std::string> rule = first ? recurrenceRuleForRecord(*first) : std::nullopt;
-    if (!rule) {
-      platform::Log::standardError("Recurrence translation error");
-      return false;
-    }
-    const std::size_t start = out.size();
-    out += "RRULE:";
-    out += *rule;
-    foldFrom(out, start);
-    out += "\r\n";
-    return true;
-  }
-
+  if (key == tessel::TesselEntity_Calendars_Recurrence) return appendRecurrence(out, *records);
   return false;
+}
+
+void ZetoCalendarExporter::appendMappedProperty(std::string& out, std::string_view property,
+                                                const Value& value) const {
+  if (const CalendarDate* date = value.asDate()) {
+    // Writing a date may switch it to GMT; the record stays as the caller gave it.
+    CalendarDate copy = *date;
+    appendDatePropertyLine(out, property, copy);
+    return;
+  }
+  const std::string* text = value.asString();
+  appendFoldedLine(out, property,
+                   ":" + iCalendarEscapeValue(text ? *text : iCalendarRepresentation(value)));
+}
+
+bool ZetoCalendarExporter::appendOrganizer(std::string& out, const Value& value) const {
+  std::optional<std::string> address;
+  if (const Dictionary* organizer = value.asDictionary()) {
+    address = addressForRecord(*organizer);
+  } else if (const Array* organizers = value.asArray()) {
+    // The flattened record lists the organizer like any related record; an empty list
+    // is a broken record, and the export of the whole calendar is abandoned.
+    if (organizers->empty()) throw std::out_of_range("organizer array is empty");
+    address = addressForRecord(recordOrEmpty(organizers->front()));
+  }
+  if (!address) {
+    platform::Log::standardError("Organizer translation error");
+    return false;
+  }
+  appendFoldedLine(out, "ORGANIZER", *address);
+  return true;
+}
+
+void ZetoCalendarExporter::appendAttendees(std::string& out, const Array& attendees) const {
+  for (const Value& attendee : attendees) {
+    if (std::optional<std::string> address = addressForRecord(recordOrEmpty(attendee))) {
+      appendFoldedLine(out, "ATTENDEE", *address);
+    }
+  }
+}
+
+bool ZetoCalendarExporter::appendRecurrence(std::string& out, const Array& rules) const {
+  // The device follows one rule per event; further rules are dropped.
+  const Dictionary* first = rules.front().asDictionary();
+  std::optional<std::string> rule = first ? recurrenceRuleForRecord(*first) : std::nullopt;
+  if (!rule) {
+    platform::Log::standardError("Recurrence translation error");
+    return false;
+  }
+  appendFoldedLine(out, "RRULE:", *rule);
+  return true;
 }
 
 std::optional<std::string_view> ZetoCalendarExporter::mappingForSyncKey(
@@ -406,11 +396,10 @@ std::optional<std::string> ZetoCalendarExporter::recurrenceRuleForRecord(
     }
   }
 
-  const Value* freqs = rule.find(tessel::TesselAttribute_Calendars_Recurrence_Bydayfreq);
-  const Value* days = rule.find(tessel::TesselAttribute_Calendars_Recurrence_Bydaydays);
-  if (freqs && days && freqs->asArray() && days->asArray()) {
-    if (std::optional<std::string> byDay =
-            iCalendarRepresentationForByDayFreq(*freqs->asArray(), *days->asArray())) {
+  const Array* freqs = rule.arrayAt(tessel::TesselAttribute_Calendars_Recurrence_Bydayfreq);
+  const Array* days = rule.arrayAt(tessel::TesselAttribute_Calendars_Recurrence_Bydaydays);
+  if (freqs && days) {
+    if (std::optional<std::string> byDay = iCalendarRepresentationForByDayFreq(*freqs, *days)) {
       appendRFC2445Parameter(text, "BYDAY", *byDay);
     }
   }

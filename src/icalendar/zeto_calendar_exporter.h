@@ -67,6 +67,12 @@ class ZetoCalendarExporter {
   // propertyForKey, appending to `out`; false when the key gives nothing.
   bool appendPropertyForKey(std::string& out, std::string_view key, std::string_view entity,
                             const platform::Value* value) const;
+  // The writers of the kinds of keys appendPropertyForKey tells apart.
+  void appendMappedProperty(std::string& out, std::string_view property,
+                            const platform::Value& value) const;
+  bool appendOrganizer(std::string& out, const platform::Value& value) const;
+  void appendAttendees(std::string& out, const platform::Array& attendees) const;
+  bool appendRecurrence(std::string& out, const platform::Array& rules) const;
   void appendAlarm(std::string& out, const platform::Dictionary& alarm) const;
   void appendExceptionDates(std::string& out, const platform::Array& dates) const;
   bool appendStatus(std::string& out, const platform::Value* value) const;

@@ -39,6 +39,10 @@ enum class ZetoEvent : std::int32_t {
 using ZetoEventCallback = void (*)(ZetoRef device, std::int32_t event, void* ignored,
                                    void* context);
 
+// The text form of a player's unique identifier: upper-case hexadecimal without leading
+// zeros ("%llX"). The sync client's identifier ends with it, and lock files are named by it.
+std::string formatUniqueId(std::uint64_t id);
+
 // Results of the library's operations, besides 0 for success.
 inline constexpr std::int32_t kZetoSuccess = 0;
 inline constexpr std::int32_t kZetoErrorNotMounted = -25178;

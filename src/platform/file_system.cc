@@ -5,29 +5,12 @@
 #include <sys/sysmacros.h>
 
 #include <cstdio>
-#include <fstream>
-#include <sstream>
 #include <system_error>
+
+#include "platform/linux/mount_info.h"
 
 namespace zt::platform {
 namespace {
-
-// mountinfo escapes blanks, tabs, new lines and backslashes in paths as \ooo.
-std::string unescapeMountPath(const std::string& text) {
-  std::string result;
-  for (std::size_t i = 0; i < text.size(); ++i) {
-    if (text[i] == '\\' && i + 3 < text.size()) {
-      const std::string digits = text.substr(i + 1, 3);
-      if (digits.find_first_not_of("01234567") == std::string::npos) {
-        result += static_cast<char>(std::stoi(digits, nullptr, 8));
-        i += 3;
-        continue;
-      }
-    }
-    result += text[i];
-  }
-  return result;
-}
 
 bool isWithin(const std::string& path, const std::string& mountPoint) {
   if (mountPoint == "/") return true;
@@ -42,25 +25,15 @@ std::optional<std::string> mountSource(const std::filesystem::path& path, dev_t 
   std::error_code error;
   const std::string canonical = std::filesystem::canonical(path, error).string();
   if (error) return std::nullopt;
-  std::ifstream mountinfo("/proc/self/mountinfo");
+  const std::optional<std::string> table = readMountInfo();
+  if (!table) return std::nullopt;
   std::optional<std::string> best;
   std::size_t bestLength = 0;
-  for (std::string line; std::getline(mountinfo, line);) {
-    std::istringstream fields(line);
-    std::string id, parent, majorMinor, root, mountPoint;
-    fields >> id >> parent >> majorMinor >> root >> mountPoint;
-    const std::size_t separator = line.find(" - ");
-    if (separator == std::string::npos) continue;
-    std::istringstream tail(line.substr(separator + 3));
-    std::string type, source;
-    tail >> type >> source;
-    unsigned major = 0, minor = 0;
-    if (std::sscanf(majorMinor.c_str(), "%u:%u", &major, &minor) != 2) continue;
-    if (makedev(major, minor) != device) continue;
-    mountPoint = unescapeMountPath(mountPoint);
-    if (!isWithin(canonical, mountPoint) || mountPoint.size() < bestLength) continue;
-    bestLength = mountPoint.size();
-    best = unescapeMountPath(source);
+  for (const MountInfoEntry& mount : parseMountInfo(*table)) {
+    if (makedev(mount.major, mount.minor) != device) continue;
+    if (!isWithin(canonical, mount.mountPoint) || mount.mountPoint.size() < bestLength) continue;
+    bestLength = mount.mountPoint.size();
+    best = mount.source;
   }
   return best;
 }

@@ -83,8 +83,7 @@ RegistryIterator HardwareRegistry::makeIterator(std::vector<std::string> paths) 
 
 std::unique_ptr<HardwareRegistry> makeHardwareRegistry() {
   if (auto deviceFile = virtualDeviceFileFromEnvironment()) {
-    std::string whyNot;
-    return std::make_unique<VirtualHardwareRegistry>(loadVirtualPlayers(*deviceFile, whyNot));
+    return std::make_unique<VirtualHardwareRegistry>(loadVirtualPlayers(*deviceFile).valueOrNone());
   }
   return std::make_unique<LinuxHardwareRegistry>();
 }

@@ -112,18 +112,18 @@ std::optional<Value> convert(plist_t node) {
 
 }  // namespace
 
-std::variant<Value, std::string> parsePropertyList(std::span<const std::uint8_t> document) {
-  if (document.empty()) return std::string("The property list is empty");
+Result<Value> parsePropertyList(std::span<const std::uint8_t> document) {
+  if (document.empty()) return Error{"The property list is empty"};
   if (document.size() > std::numeric_limits<std::uint32_t>::max()) {
-    return std::string("The property list is too large");
+    return Error{"The property list is too large"};
   }
   plist_t raw = nullptr;
   plist_from_memory(reinterpret_cast<const char*>(document.data()),
                     static_cast<std::uint32_t>(document.size()), &raw);
   PlistPtr root(raw);
-  if (!root) return std::string("The data is not a well-formed property list");
+  if (!root) return Error{"The data is not a well-formed property list"};
   auto value = convert(root.get());
-  if (!value) return std::string("The property list holds a value of an unsupported type");
+  if (!value) return Error{"The property list holds a value of an unsupported type"};
   return std::move(*value);
 }
 

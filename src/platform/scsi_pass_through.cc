@@ -10,8 +10,7 @@ namespace zt::platform {
 
 std::unique_ptr<ScsiPassThrough> makeScsiPassThrough() {
   if (auto deviceFile = virtualDeviceFileFromEnvironment()) {
-    std::string whyNot;
-    return std::make_unique<VirtualScsiPassThrough>(loadVirtualPlayers(*deviceFile, whyNot));
+    return std::make_unique<VirtualScsiPassThrough>(loadVirtualPlayers(*deviceFile).valueOrNone());
   }
   return std::make_unique<LinuxScsiPassThrough>();
 }

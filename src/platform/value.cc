@@ -82,6 +82,20 @@ bool Dictionary::erase(std::string_view key) {
   return false;
 }
 
+std::vector<std::string> stringsIn(const Array& list) {
+  std::vector<std::string> strings;
+  strings.reserve(list.size());
+  for (const Value& element : list) {
+    if (const std::string* text = element.asString()) strings.push_back(*text);
+  }
+  return strings;
+}
+
+std::vector<std::string> stringsIn(const Value* list) {
+  const Array* array = list ? list->asArray() : nullptr;
+  return array ? stringsIn(*array) : std::vector<std::string>();
+}
+
 bool Dictionary::operator==(const Dictionary& other) const {
   return entries_ == other.entries_;
 }

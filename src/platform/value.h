@@ -65,6 +65,14 @@ class Dictionary {
   const Value* find(std::string_view key) const;
   Value* find(std::string_view key);
   bool contains(std::string_view key) const;
+  // The value of a key when it is of the asked kind; null when the key is missing or holds
+  // another kind. Defined after Value.
+  const std::string* stringAt(std::string_view key) const;
+  const Number* numberAt(std::string_view key) const;
+  const CalendarDate* dateAt(std::string_view key) const;
+  const Data* dataAt(std::string_view key) const;
+  const Array* arrayAt(std::string_view key) const;
+  const Dictionary* dictionaryAt(std::string_view key) const;
   // Replaces the value of an existing key in place, or appends the key at the end.
   void set(std::string_view key, Value value);
   bool erase(std::string_view key);
@@ -80,6 +88,9 @@ class Dictionary {
   bool operator==(const Dictionary& other) const;
 
  private:
+  template <typename T>
+  const T* kindAt(std::string_view key, const T* (Value::*as)() const) const;
+
   std::vector<Entry> entries_;
 };
 
@@ -131,8 +142,36 @@ class Value {
   std::variant<std::string, Number, CalendarDate, Url, Data, Array, Dictionary> v_;
 };
 
+// The strings of a list value, such as the identifiers a relationship holds, in order;
+// elements of another kind are skipped, and anything but a list holds none.
+std::vector<std::string> stringsIn(const Array& list);
+std::vector<std::string> stringsIn(const Value* list);
+
 inline bool Dictionary::contains(std::string_view key) const {
   return find(key) != nullptr;
+}
+template <typename T>
+const T* Dictionary::kindAt(std::string_view key, const T* (Value::*as)() const) const {
+  const Value* value = find(key);
+  return value ? (value->*as)() : nullptr;
+}
+inline const std::string* Dictionary::stringAt(std::string_view key) const {
+  return kindAt(key, &Value::asString);
+}
+inline const Number* Dictionary::numberAt(std::string_view key) const {
+  return kindAt(key, &Value::asNumber);
+}
+inline const CalendarDate* Dictionary::dateAt(std::string_view key) const {
+  return kindAt(key, &Value::asDate);
+}
+inline const Data* Dictionary::dataAt(std::string_view key) const {
+  return kindAt(key, &Value::asData);
+}
+inline const Array* Dictionary::arrayAt(std::string_view key) const {
+  return kindAt(key, &Value::asArray);
+}
+inline const Dictionary* Dictionary::dictionaryAt(std::string_view key) const {
+  return kindAt(key, &Value::asDictionary);
 }
 inline std::size_t Dictionary::size() const {
   return entries_.size();

@@ -6,23 +6,20 @@
 #include "filters/zeto_calendar_filter.h"
 #include "filters/zeto_contact_filter.h"
 #include "platform/log.h"
+#include "platform/sync_progress.h"
 #include "sync/sync_status.h"
 #include "tessel/schema.h"
 
 namespace zt::sync {
 
 using platform::Log;
+using namespace platform::sync_progress;  // the progress names, in this source file only
 
 namespace {
 
 // The platform's identifier of the UTF-16 big-endian text encoding, in which the contacts
 // file is written.
 constexpr std::uint32_t kUtf16BigEndianEncoding = 0x90000100;
-
-const std::string kConnectingPhase = "TesselClientConnectingPhase";
-const std::string kMinglingPhase = "TesselClientMinglingPhase";
-const std::string kUploadingPhase = "TesselClientUploadingPhase";
-const std::string kDisconnectingPhase = "TesselClientDisconnectingPhase";
 
 }  // namespace
 
@@ -114,8 +111,7 @@ bool ZTSyncManager::doCoreSync() {
     _syncSession->prepareToPullChanges(_entitiesToSync);
     return true;
   } catch (const tessel::Exception& exception) {
-    Log::debug("Exception while preparing to pull changes from sync server:\n%@", exception);
-    setLastStatusForException(exception);
+    reportEngineException("preparing to pull changes from sync server", exception);
     return false;
   }
 }
@@ -169,18 +165,16 @@ void ZTSyncManager::notifyTesselWithPhase(
     const std::optional<std::string>& currentDataClass,
     const std::optional<std::vector<std::string>>& dataClassSyncing) {
   platform::Dictionary userInfo;
-  userInfo.set("TesselClientCurrentPhase", phase);
-  if (status != -1) userInfo.set("TesselClientStatus", platform::Value::integer(status));
+  userInfo.set(kCurrentPhaseKey, phase);
+  if (status != -1) userInfo.set(kStatusKey, platform::Value::integer(status));
   if (dataClassSyncing) {
     platform::Array classes(dataClassSyncing->begin(), dataClassSyncing->end());
-    userInfo.set("TesselClientDataClassSyncing", std::move(classes));
+    userInfo.set(kDataClassSyncingKey, std::move(classes));
   }
-  if (currentDataClass) userInfo.set("TesselClientDataClassProgressionPhase", *currentDataClass);
+  if (currentDataClass) userInfo.set(kDataClassKey, *currentDataClass);
   // A NaN is not equal to -1, so it is passed on like any other percentage.
-  if (percent != -1.0f) {
-    userInfo.set("TesselClientPercentProgressionPhase", platform::Value::real(percent));
-  }
-  services_.notifications.post("TesselClientSyncNotification", _syncClientID, userInfo);
+  if (percent != -1.0f) userInfo.set(kPercentKey, platform::Value::real(percent));
+  services_.notifications.post(kNotificationName, _syncClientID, userInfo);
 }
 
 void ZTSyncManager::notifyTesselWithPhase(const std::string& phase, float percent) {

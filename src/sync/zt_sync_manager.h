@@ -4,6 +4,7 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "platform/device_library.h"
@@ -22,7 +23,8 @@ namespace zt::sync {
 // The spine of one sync: one instance per process, made with the sync client identifier and
 // asked once to doSync. It owns the engine client, session and snapshot, the player's
 // reference, lock and paths, the per-data-class decisions and the outcome status, and posts
-// the progress notifications. The syncers call back into it for all of these.
+// the progress notifications. The syncers, made through the makers it is given, use it for
+// all of these.
 class ZTSyncManager {
  public:
   ZTSyncManager(std::string syncClientID, SyncServices services);
@@ -89,6 +91,9 @@ class ZTSyncManager {
   }
   void setLastUsedSyncToolWasDifferentIsCached(bool cached);
   void setLastStatusForException(const tessel::Exception& exception);
+  // How every step reports an engine exception it stops on: a debug line "Exception while
+  // <doing>:" with the exception, and the status the exception stands for.
+  void reportEngineException(std::string_view doing, const tessel::Exception& exception);
   void setLastStatus(std::int32_t status) { _lastStatus = status; }
   std::int32_t lastStatus() const { return _lastStatus; }
   bool shouldSyncContacts() const { return _shouldSyncContacts; }

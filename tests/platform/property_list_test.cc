@@ -4,13 +4,12 @@
 
 #include <string>
 #include <string_view>
-#include <variant>
 #include <vector>
 
 namespace zt::platform {
 namespace {
 
-std::variant<Value, std::string> parse(std::string_view text) {
+Result<Value> parse(std::string_view text) {
   return parsePropertyList(
       std::span(reinterpret_cast<const std::uint8_t*>(text.data()), text.size()));
 }
@@ -26,8 +25,8 @@ TEST(PropertyList, XmlValuesBecomeRecordValues) {
             "<key>s</key><string>caf\xC3\xA9 &amp; co</string><key>d</key><data>AAEC</data>"
             "<key>t</key><date>2007-03-15T12:30:00Z</date>"
             "<key>l</key><array><false/><dict/></array></dict>"));
-  ASSERT_TRUE(std::holds_alternative<Value>(parsed)) << std::get<std::string>(parsed);
-  const Dictionary* root = std::get<Value>(parsed).asDictionary();
+  ASSERT_TRUE(parsed) << parsed.error();
+  const Dictionary* root = parsed.value().asDictionary();
   ASSERT_TRUE(root);
   std::vector<std::string> keys;
   for (const auto& [key, value] : *root) keys.push_back(key);
@@ -46,8 +45,8 @@ TEST(PropertyList, StringEndsAtANulByte) {
   // A device's document may hold NUL bytes; libplist keeps a string's text up to the first.
   using namespace std::string_view_literals;
   auto parsed = parse(plist("<dict><key>k</key><string>a\0b</string></dict>"sv));
-  ASSERT_TRUE(std::holds_alternative<Value>(parsed));
-  const Value* text = std::get<Value>(parsed).asDictionary()->find("k");
+  ASSERT_TRUE(parsed);
+  const Value* text = parsed.value().asDictionary()->find("k");
   ASSERT_TRUE(text && text->asString());
   EXPECT_EQ(*text->asString(), "a");
 }
@@ -56,8 +55,8 @@ TEST(PropertyList, FailuresSayWhy) {
   for (std::string_view text : {std::string_view(""), std::string_view("not a plist"),
                                 std::string_view("<plist><dict><key>a</key>")}) {
     auto parsed = parse(text);
-    ASSERT_TRUE(std::holds_alternative<std::string>(parsed)) << text;
-    EXPECT_FALSE(std::get<std::string>(parsed).empty());
+    ASSERT_FALSE(parsed) << text;
+    EXPECT_FALSE(parsed.error().empty());
   }
 }
 

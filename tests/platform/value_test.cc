@@ -28,6 +28,19 @@ TEST(Dictionary, KeyOrderIsPartOfEquality) {
   EXPECT_EQ(a, (Dictionary{{"x", "1"}, {"y", "2"}}));
 }
 
+TEST(Dictionary, TypedLookupsAnswerOnlyTheirKind) {
+  const Dictionary d{{"name", "Ada"}, {"ids", Value(Array{"a", Value::integer(1), "b"})}};
+  EXPECT_EQ(*d.stringAt("name"), "Ada");
+  EXPECT_EQ(d.stringAt("ids"), nullptr);
+  EXPECT_EQ(d.numberAt("name"), nullptr);
+  EXPECT_EQ(d.arrayAt("missing"), nullptr);
+  EXPECT_EQ(d.arrayAt("ids")->size(), 3u);
+  // A relationship's identifiers: the strings of a list, in order; nothing else counts.
+  EXPECT_EQ(stringsIn(d.find("ids")), (std::vector<std::string>{"a", "b"}));
+  EXPECT_TRUE(stringsIn(d.find("name")).empty());
+  EXPECT_TRUE(stringsIn(nullptr).empty());
+}
+
 TEST(Number, KindsAreKeptAndConvertLikeC) {
   EXPECT_EQ(Number::boolean(true).kind(), Number::Kind::Boolean);
   EXPECT_FALSE(Number::integer(1) == Number::boolean(true));

@@ -1,10 +1,7 @@
 #pragma once
 
-#include <cinttypes>
 #include <cstdint>
-#include <cstdio>
 #include <optional>
-#include <string>
 #include <string_view>
 
 namespace zt::platform {
@@ -28,13 +25,6 @@ inline std::optional<std::uint64_t> parseUniqueId(std::string_view text) {
     value = value << 4 | static_cast<std::uint64_t>(digit);
   }
   return value;
-}
-
-// The text form of an identifier: upper-case hexadecimal without leading zeros ("%llX").
-inline std::string formatUniqueId(std::uint64_t id) {
-  char text[17];
-  std::snprintf(text, sizeof text, "%" PRIX64, id);
-  return text;
 }
 
 }  // namespace zt::platform

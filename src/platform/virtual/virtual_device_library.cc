@@ -41,10 +41,9 @@ VirtualDeviceLibrary::~VirtualDeviceLibrary() {
 
 bool VirtualDeviceLibrary::load() {
   if (players_) return true;
-  std::string whyNot;
-  auto players = loadVirtualPlayers(deviceFile_, whyNot);
+  Result<std::vector<VirtualPlayer>> players = loadVirtualPlayers(deviceFile_);
   if (!players) {
-    Log::always("Virtual Zeto device file %s unusable: %s", deviceFile_, whyNot);
+    Log::always("Virtual Zeto device file %s unusable: %s", deviceFile_, players.error());
     return false;
   }
   players_.emplace();

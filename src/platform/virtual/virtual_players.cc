@@ -13,11 +13,9 @@ namespace {
 
 constexpr std::string_view kNodePrefix = "/dev/zetovirt";
 
-std::optional<VirtualPlayer> parsePlayer(const nlohmann::json& entry, std::size_t index,
-                                         std::string& whyNot) {
-  auto fail = [&](const std::string& reason) -> std::optional<VirtualPlayer> {
-    whyNot = "entry " + std::to_string(index) + ": " + reason;
-    return std::nullopt;
+Result<VirtualPlayer> parsePlayer(const nlohmann::json& entry, std::size_t index) {
+  auto fail = [&](const std::string& reason) -> Result<VirtualPlayer> {
+    return Error{"entry " + std::to_string(index) + ": " + reason};
   };
   if (!entry.is_object()) return fail("not an object");
   VirtualPlayer player;
@@ -54,36 +52,25 @@ std::optional<VirtualPlayer> parsePlayer(const nlohmann::json& entry, std::size_
 
 }  // namespace
 
-std::optional<std::vector<VirtualPlayer>> parseVirtualPlayers(std::string_view json,
-                                                              std::string& whyNot) {
+Result<std::vector<VirtualPlayer>> parseVirtualPlayers(std::string_view json) {
   nlohmann::json document = nlohmann::json::parse(json, nullptr, /*allow_exceptions=*/false);
-  if (document.is_discarded()) {
-    whyNot = "not JSON";
-    return std::nullopt;
-  }
-  if (!document.is_array()) {
-    whyNot = "not an array of players";
-    return std::nullopt;
-  }
+  if (document.is_discarded()) return Error{"not JSON"};
+  if (!document.is_array()) return Error{"not an array of players"};
   std::vector<VirtualPlayer> players;
   for (std::size_t i = 0; i < document.size(); ++i) {
-    auto player = parsePlayer(document[i], i, whyNot);
-    if (!player) return std::nullopt;
-    players.push_back(std::move(*player));
+    Result<VirtualPlayer> player = parsePlayer(document[i], i);
+    if (!player) return Error{player.error()};
+    players.push_back(std::move(player).value());
   }
   return players;
 }
 
-std::optional<std::vector<VirtualPlayer>> loadVirtualPlayers(const std::string& path,
-                                                             std::string& whyNot) {
+Result<std::vector<VirtualPlayer>> loadVirtualPlayers(const std::string& path) {
   std::ifstream file(path, std::ios::binary);
-  if (!file) {
-    whyNot = "cannot be read";
-    return std::nullopt;
-  }
+  if (!file) return Error{"cannot be read"};
   std::ostringstream text;
   text << file.rdbuf();
-  return parseVirtualPlayers(text.str(), whyNot);
+  return parseVirtualPlayers(text.str());
 }
 
 std::optional<std::string> virtualDeviceFileFromEnvironment() {

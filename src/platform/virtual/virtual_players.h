@@ -7,6 +7,8 @@
 #include <string_view>
 #include <vector>
 
+#include "platform/result.h"
+
 namespace zt::platform {
 
 // One simulated Zeto player of the virtual device file ($ZETO_VIRTUAL_DEVICES), an array of
@@ -23,13 +25,11 @@ struct VirtualPlayer {
   std::optional<std::string> checkpoint;  // the self-description document its probe answers
 };
 
-// The players of a device file's text, in file order; none when the text is not a valid
-// device file, with the reason in `whyNot`.
-std::optional<std::vector<VirtualPlayer>> parseVirtualPlayers(std::string_view json,
-                                                              std::string& whyNot);
+// The players of a device file's text, in file order; the reason when the text is not a
+// valid device file.
+Result<std::vector<VirtualPlayer>> parseVirtualPlayers(std::string_view json);
 // The same for a file.
-std::optional<std::vector<VirtualPlayer>> loadVirtualPlayers(const std::string& path,
-                                                             std::string& whyNot);
+Result<std::vector<VirtualPlayer>> loadVirtualPlayers(const std::string& path);
 
 // The device file named by $ZETO_VIRTUAL_DEVICES; none when the variable is unset or empty.
 std::optional<std::string> virtualDeviceFileFromEnvironment();

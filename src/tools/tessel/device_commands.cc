@@ -13,6 +13,7 @@
 
 #include "platform/device_library.h"
 #include "platform/notification_listener.h"
+#include "platform/sync_progress.h"
 #include "platform/terminal.h"
 #include "tessel/exception.h"
 
@@ -21,9 +22,7 @@ namespace tessel::cli {
 namespace {
 
 std::string hexIdentifier(std::uint64_t uniqueID) {
-  char text[17];
-  std::snprintf(text, sizeof text, "%llX", static_cast<unsigned long long>(uniqueID));
-  return text;
+  return zt::platform::formatUniqueId(uniqueID);
 }
 
 volatile std::sig_atomic_t interrupted = 0;
@@ -41,10 +40,10 @@ struct Progress {
 
 std::string phaseWord(const std::string& phase) {
   static const std::map<std::string, std::string, std::less<>> words = {
-      {"TesselClientConnectingPhase", "connecting"},
-      {"TesselClientMinglingPhase", "preparing"},
-      {"TesselClientUploadingPhase", "writing"},
-      {"TesselClientDisconnectingPhase", "done"},
+      {zt::platform::sync_progress::kConnectingPhase, "connecting"},
+      {zt::platform::sync_progress::kMinglingPhase, "preparing"},
+      {zt::platform::sync_progress::kUploadingPhase, "writing"},
+      {zt::platform::sync_progress::kDisconnectingPhase, "done"},
   };
   auto it = words.find(phase);
   return it == words.end() ? phase : it->second;
@@ -81,14 +80,15 @@ std::string bar(const std::string& client, const Progress& progress) {
 
 // Reads one notification's payload into the player's progress.
 void update(Progress& progress, const zt::platform::Dictionary& info) {
-  if (const auto* phase = info.find("TesselClientCurrentPhase"); phase && phase->asString()) {
+  if (const auto* phase = info.find(zt::platform::sync_progress::kCurrentPhaseKey);
+      phase && phase->asString()) {
     progress.phase = *phase->asString();
   }
-  if (const auto* percent = info.find("TesselClientPercentProgressionPhase");
+  if (const auto* percent = info.find(zt::platform::sync_progress::kPercentKey);
       percent && percent->asNumber()) {
     progress.percent = percent->asNumber()->doubleValue();
   }
-  if (const auto* classes = info.find("TesselClientDataClassSyncing");
+  if (const auto* classes = info.find(zt::platform::sync_progress::kDataClassSyncingKey);
       classes && classes->asArray()) {
     std::string names;
     for (const zt::platform::Value& name : *classes->asArray()) {
@@ -100,7 +100,8 @@ void update(Progress& progress, const zt::platform::Dictionary& info) {
     }
     progress.dataClasses = names.empty() ? "nothing to sync" : names;
   }
-  if (const auto* status = info.find("TesselClientStatus"); status && status->asNumber()) {
+  if (const auto* status = info.find(zt::platform::sync_progress::kStatusKey);
+      status && status->asNumber()) {
     progress.status = status->asNumber()->int64Value();
   }
 }
@@ -147,7 +148,7 @@ int watchSyncs(CommandContext& context, const std::optional<std::string>& client
   while (!interrupted) {
     std::optional<zt::platform::Notification> posted =
         listener->next(std::chrono::milliseconds(250));
-    if (!posted || posted->name != "TesselClientSyncNotification") continue;
+    if (!posted || posted->name != zt::platform::sync_progress::kNotificationName) continue;
     if (clientIdentifier && posted->sender != *clientIdentifier) continue;
     Progress& progress = players[posted->sender];
     update(progress, posted->userInfo);

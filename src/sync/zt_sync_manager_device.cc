@@ -34,10 +34,8 @@ bool ZTSyncManager::checkForConnectedZeto() {
     return false;
   }
   for (platform::ZetoRef device : devices) {
-    char zetoID[17];
-    std::snprintf(zetoID, sizeof zetoID, "%llX",
-                  static_cast<unsigned long long>(services_.devices.ZetoGetUniqueID(device)));
-    if (zetoIDMatchesSyncClientID(zetoID)) {
+    if (zetoIDMatchesSyncClientID(
+            platform::formatUniqueId(services_.devices.ZetoGetUniqueID(device)))) {
       Log::debug("Zeto is connected");
       _zetoRef = device;
       return true;

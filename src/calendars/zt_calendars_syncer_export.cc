@@ -23,11 +23,6 @@ namespace {
 // empty organizer list) reach the manager, which reports them as errors.
 constexpr std::string_view kForeignException = "std::exception";
 
-void reportDisassemblyFailure(sync::ZTSyncManager& manager, const tessel::Exception& exception) {
-  Log::debug("Exception while disassembling data:\n%@", exception);
-  manager.setLastStatusForException(exception);
-}
-
 }  // namespace
 
 std::optional<std::vector<std::uint8_t>> ZTCalendarsSyncer::disassembleDataForCalendarWithID(
@@ -42,9 +37,7 @@ std::optional<std::vector<std::uint8_t>> ZTCalendarsSyncer::disassembleDataForCa
       _syncManager.setLastStatus(sync::kStatusEngineFailure);
       return std::nullopt;
     }
-    const platform::Value* titleValue =
-        calendar->find(tessel::TesselAttribute_Calendars_Calendar_Title);
-    const std::string* title = titleValue ? titleValue->asString() : nullptr;
+    const std::string* title = calendar->stringAt(tessel::TesselAttribute_Calendars_Calendar_Title);
     if (!title) {
       Log::debug("Calendar has no name - ignoring this calendar");
       return std::nullopt;
@@ -63,10 +56,11 @@ std::optional<std::vector<std::uint8_t>> ZTCalendarsSyncer::disassembleDataForCa
     }
     return data;
   } catch (const tessel::Exception& exception) {
-    reportDisassemblyFailure(_syncManager, exception);
+    _syncManager.reportEngineException("disassembling data", exception);
     return data;
   } catch (const std::exception& exception) {
-    reportDisassemblyFailure(_syncManager, tessel::Exception(kForeignException, exception.what()));
+    _syncManager.reportEngineException("disassembling data",
+                                       tessel::Exception(kForeignException, exception.what()));
     return data;
   }
 }

@@ -53,8 +53,7 @@ bool ZTSyncManager::initiateSyncSession() {
       setShouldSyncCalendars(true);
     }
   } catch (const tessel::Exception& exception) {
-    Log::debug("Exception while getting sync client:\n%@", exception);
-    setLastStatusForException(exception);
+    reportEngineException("getting sync client", exception);
     return false;
   }
   // A data class whose syncer this tool does not have is left out, so that the engine never
@@ -155,9 +154,7 @@ bool ZTSyncManager::registerEntitiesToSync() {
     _syncSession = tessel::Session::begin(*_syncClient, _entitiesToSync);
     return true;
   } catch (const tessel::Exception& exception) {
-    Log::debug("Exception while registering entities to sync and getting sync session:\n%@",
-               exception);
-    setLastStatusForException(exception);
+    reportEngineException("registering entities to sync and getting sync session", exception);
     return false;
   }
 }
@@ -168,8 +165,7 @@ bool ZTSyncManager::commitAcceptedChanges() {
     _syncSession->clientCommittedAcceptedChanges();
     return true;
   } catch (const tessel::Exception& exception) {
-    Log::debug("Exception while commiting accepted changes:\n%@", exception);
-    setLastStatusForException(exception);
+    reportEngineException("commiting accepted changes", exception);
     return false;
   }
 }
@@ -189,14 +185,19 @@ void ZTSyncManager::cleanupSyncSession() {
       }
     }
   } catch (const tessel::Exception& exception) {
-    Log::debug("Exception while cleaning sync session:\n%@", exception);
-    setLastStatusForException(exception);
+    reportEngineException("cleaning sync session", exception);
   }
 }
 
 void ZTSyncManager::setLastStatusForException(const tessel::Exception& exception) {
   _lastStatus = exception.name() == tessel::TesselSessionCancelledException ? kStatusCancelled
                                                                             : kStatusEngineFailure;
+}
+
+void ZTSyncManager::reportEngineException(std::string_view doing,
+                                          const tessel::Exception& exception) {
+  Log::debug("Exception while " + std::string(doing) + ":\n%@", exception);
+  setLastStatusForException(exception);
 }
 
 std::shared_ptr<tessel::Snapshot> ZTSyncManager::snapshotOfRecordsInTruth() {

@@ -16,12 +16,10 @@ bool ZTContactsSyncer::isSelected(const platform::Dictionary& contact) {
   if (!_contactFilter || _contactFilter->useAllContacts()) return true;
   const platform::Value* parents =
       contact.find(tessel::TesselRelationship_Contacts_Contact_ParentGroups);
-  const platform::Array* groups = parents ? parents->asArray() : nullptr;
-  if (!groups) return false;
+  if (!parents || !parents->asArray()) return false;
   const std::set<std::string>& selected = expandedFilteredGroupsIDs();
-  for (const platform::Value& group : *groups) {
-    const std::string* identifier = group.asString();
-    if (identifier && selected.contains(*identifier)) return true;
+  for (const std::string& identifier : platform::stringsIn(parents)) {
+    if (selected.contains(identifier)) return true;
   }
   return false;
 }
@@ -58,8 +56,7 @@ bool ZTContactsSyncer::disassembleData() {
     Log::debug("Effectively stored %ul contacts on Zeto", written);
     return true;
   } catch (const tessel::Exception& exception) {
-    Log::debug("Exception while getting changes:\n%@", exception);
-    _syncManager.setLastStatusForException(exception);
+    _syncManager.reportEngineException("getting changes", exception);
     return false;
   }
 }
