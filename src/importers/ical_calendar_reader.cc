@@ -291,8 +291,7 @@ class CalendarBuilder {
           alarmRecord(*item.document, *item.zones, alarm, fields.start, fields.end);
       if (!record) continue;
       std::string id = item.identifier + "#alarm" + std::to_string(++count);
-      const Value* entity = record->find(TesselRecordEntityNameKey);
-      const std::string& name = *entity->asString();
+      const std::string& name = *record->stringAt(TesselRecordEntityNameKey);
       (name == TesselEntity_Calendars_AudioAlarm  ? related.audioAlarms
        : name == TesselEntity_Calendars_MailAlarm ? related.mailAlarms
                                                   : related.displayAlarms)

@@ -74,16 +74,8 @@ std::string calendarOf(const std::string& identifier) {
   return identifier.substr(0, identifier.find('/'));
 }
 
-const Array* arrayAt(const Dictionary& record, std::string_view key) {
-  const Value* value = record.find(key);
-  return value != nullptr ? value->asArray() : nullptr;
-}
-
-void appendStrings(const Array* array, std::vector<std::string>& out) {
-  if (array == nullptr) return;
-  for (const Value& value : *array) {
-    if (const std::string* text = value.asString()) out.push_back(*text);
-  }
+void appendStrings(const Value* list, std::vector<std::string>& out) {
+  for (std::string& text : zt::platform::stringsIn(list)) out.push_back(std::move(text));
 }
 
 // The relationships through which an event or task lists records of its own.
@@ -111,11 +103,10 @@ StoredCalendars storedCalendars(const Store& store, const std::vector<ICalCalend
   StoredCalendars stored;
   for (const ICalCalendar& calendar : calendars) stored.records[calendar.identifier];
   store.forEachRecord([&](const Record& record) {
-    const Value* entity = record.record.find(TesselRecordEntityNameKey);
-    const std::string* name = entity != nullptr ? entity->asString() : nullptr;
+    const std::string* name = record.record.stringAt(TesselRecordEntityNameKey);
     if (name != nullptr && *name == TesselEntity_Calendars_Calendar) stored.live.insert(record.id);
     if (name != nullptr && *name == TesselEntity_Calendars_CalendarOrder && stored.order.empty()) {
-      appendStrings(arrayAt(record.record, TesselRelationship_Calendars_CalendarOrder_Calendars),
+      appendStrings(record.record.find(TesselRelationship_Calendars_CalendarOrder_Calendars),
                     stored.order);
     }
     const auto found = stored.records.find(calendarOf(record.id));
@@ -140,21 +131,20 @@ void mergeCalendar(const ICalCalendar& calendar, const RecordMap& before, SyncDe
     // so do the records they list.
     std::vector<std::string> keptEvents, keptTasks;
     for (const auto& [id, record] : before) {
-      const Value* entity = record.find(TesselRecordEntityNameKey);
-      const std::string* name = entity != nullptr ? entity->asString() : nullptr;
+      const std::string* name = record.stringAt(TesselRecordEntityNameKey);
       if (name == nullptr || produced.count(id) != 0) continue;
       const bool event = *name == TesselEntity_Calendars_Event;
       if (!event && *name != TesselEntity_Calendars_Task) continue;
       (event ? keptEvents : keptTasks).push_back(id);
       kept.insert(id);
       std::vector<std::string> owned;
-      for (std::string_view key : kOwnedRelationships) appendStrings(arrayAt(record, key), owned);
+      for (std::string_view key : kOwnedRelationships) appendStrings(record.find(key), owned);
       kept.insert(owned.begin(), owned.end());
     }
     Dictionary& calendarRecord = written.front().record;
     const auto extend = [&](std::string_view key, const std::vector<std::string>& ids) {
       if (ids.empty()) return;
-      Array list = *arrayAt(calendarRecord, key);
+      Array list = *calendarRecord.arrayAt(key);
       for (const std::string& id : ids) list.emplace_back(id);
       calendarRecord.set(key, Value(std::move(list)));
     };

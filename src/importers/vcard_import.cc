@@ -29,16 +29,6 @@ Array identifierArray(const std::vector<std::string>& identifiers) {
   return Array(identifiers.begin(), identifiers.end());
 }
 
-std::vector<std::string> stringsOf(const Value* value) {
-  std::vector<std::string> strings;
-  const Array* array = value != nullptr ? value->asArray() : nullptr;
-  if (array == nullptr) return strings;
-  for (const Value& element : *array) {
-    if (const std::string* text = element.asString()) strings.push_back(*text);
-  }
-  return strings;
-}
-
 // What earlier imports left in the store that this one does not write again.
 struct EarlierImports {
   // Their records to delete.
@@ -57,7 +47,7 @@ EarlierImports earlierImports(const Store& store, const std::vector<Record>& rec
     if (!isImportedIdentifier(record.id) || produced.contains(record.id)) {
       if (record.id.starts_with(kGroupPrefix)) {
         earlier.groupMembers[record.id] =
-            stringsOf(record.record.find(TesselRelationship_Contacts_Group_Members));
+            zt::platform::stringsIn(record.record.find(TesselRelationship_Contacts_Group_Members));
       }
       return;
     }
@@ -67,7 +57,7 @@ EarlierImports earlierImports(const Store& store, const std::vector<Record>& rec
       earlier.deletions.push_back(record.id);
     } else if (record.id.starts_with(kGroupPrefix)) {
       earlier.groupMembers[record.id] =
-          stringsOf(record.record.find(TesselRelationship_Contacts_Group_Members));
+          zt::platform::stringsIn(record.record.find(TesselRelationship_Contacts_Group_Members));
     }
   });
   return earlier;
@@ -98,7 +88,8 @@ void keepEarlierMembers(const Store& store,
       continue;
     }
     Dictionary& group = records[producedGroup->second].record;
-    std::vector<std::string> now = stringsOf(group.find(TesselRelationship_Contacts_Group_Members));
+    std::vector<std::string> now =
+        zt::platform::stringsIn(group.find(TesselRelationship_Contacts_Group_Members));
     for (std::string& member : now) {
       if (std::find(kept.begin(), kept.end(), member) == kept.end()) kept.push_back(member);
     }

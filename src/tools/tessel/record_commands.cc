@@ -64,8 +64,7 @@ void listRecords(CommandContext& context, const std::optional<std::string>& enti
       out << recordToJsonLine(record.id, record.record) << '\n';
       return;
     }
-    const zt::platform::Value* entity = record.record.find(TesselRecordEntityNameKey);
-    const std::string* entityText = entity != nullptr ? entity->asString() : nullptr;
+    const std::string* entityText = record.record.stringAt(TesselRecordEntityNameKey);
     out << record.id << '\t' << (entityText != nullptr ? *entityText : "") << '\t'
         << recordSummary(record.record) << '\n';
   };
