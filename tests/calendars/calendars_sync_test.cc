@@ -9,6 +9,7 @@
 #include <string>
 #include <vector>
 
+#include "support/files.h"
 #include "sync/synctool_fixture.h"
 
 namespace zt::sync::test_support {
@@ -16,12 +17,7 @@ namespace {
 
 const std::string kUploading = "TesselClientUploadingPhase";
 
-std::string readFile(const fs::path& path) {
-  std::ifstream in(path, std::ios::binary);
-  std::ostringstream text;
-  text << in.rdbuf();
-  return text.str();
-}
+using zt::test_support::readFile;
 
 Json date(const std::string& wallClock, const std::string& zone = "UTC") {
   return Json{{"$date", wallClock}, {"tz", zone}};

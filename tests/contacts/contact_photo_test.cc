@@ -11,21 +11,20 @@
 #include <sstream>
 
 #include "platform/log.h"
-#include "platform/picture_maker.h"
-#include "platform/scoped_environment.h"
-#include "platform/temporary_folder.h"
+#include "support/captured_log.h"
+#include "support/picture_maker.h"
 #include "tessel/schema.h"
 
 namespace zt::contacts {
 namespace {
 
 using platform::Data;
-using platform::PictureFormat;
-using platform::PicturePattern;
 using platform::PixelSize;
+using test_support::PictureFormat;
+using test_support::PicturePattern;
 
-Data picture(platform::PictureRecipe recipe) {
-  std::optional<Data> bytes = platform::makePicture(recipe);
+Data picture(test_support::PictureRecipe recipe) {
+  std::optional<Data> bytes = test_support::makePicture(recipe);
   EXPECT_TRUE(bytes) << "libvips could not make the test picture";
   return bytes.value_or(Data{});
 }
@@ -51,36 +50,16 @@ platform::Dictionary contact(Data image) {
 // A picture service that counts how often it is made.
 class ContactPhoto : public ::testing::Test {
  protected:
-  void SetUp() override {
-    environment_.set("ZETOSYNCTOOL_LOG", (folder_ / "log").string());
-    platform::Log::configureFromEnvironment();
-    platform::Log::setDebugEnabled(true);
-  }
-  void TearDown() override {
-    platform::Log::setDebugEnabled(false);
-    environment_.unset("ZETOSYNCTOOL_LOG");
-    platform::Log::configureFromEnvironment();
-  }
+  std::vector<std::string> log() const { return log_.lines(); }
+  bool logged(std::string_view line) const { return log_.has(line); }
 
-  std::vector<std::string> log() const {
-    std::ifstream in(folder_ / "log");
-    std::vector<std::string> lines;
-    for (std::string line; std::getline(in, line);) lines.push_back(line);
-    return lines;
-  }
-  bool logged(std::string_view line) const {
-    const std::vector<std::string> lines = log();
-    return std::find(lines.begin(), lines.end(), line) != lines.end();
-  }
-
+  zt::test_support::CapturedLog log_;
+  zt::test_support::TemporaryFolder folder_;
   ContactPhotoPreparation preparation_{[this] {
     ++servicesMade_;
     return platform::makeImageService();
   }};
   int servicesMade_ = 0;
-
-  platform::test_support::TemporaryFolder folder_;
-  platform::test_support::ScopedEnvironment environment_;
 };
 
 PixelSize sizeOf(const Data& jpeg) {

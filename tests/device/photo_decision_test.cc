@@ -37,7 +37,7 @@ class PhotoDecisionTest : public ::testing::Test {
               std::string_view defaults = "") {
     VirtualPlayerFolder player(std::move(document));
     const auto deviceFile = player.writeDeviceFile();
-    platform::test_support::ScopedEnvironment environment;
+    zt::test_support::ScopedEnvironment environment;
     environment.set("ZETO_VIRTUAL_DEVICES", deviceFile.string());
     environment.set("XDG_RUNTIME_DIR", player.folder().string());
 

@@ -64,7 +64,7 @@ TEST(ExecuteInquiry, EachFailingStepHasItsResultAndMessage) {
 }
 
 TEST(ExecuteInquiry, NodesThatAreNotScsiDevicesFailCleanly) {
-  platform::test_support::TemporaryFolder folder;
+  zt::test_support::TemporaryFolder folder;
   test_support::writeFile(folder / "plain", "not a disk");
   for (const std::filesystem::path& node : {std::filesystem::path("/dev/null"), folder / "plain"}) {
     SCOPED_TRACE(node);

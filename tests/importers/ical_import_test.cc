@@ -12,6 +12,7 @@
 #include <vector>
 
 #include "importers/ical_windows_zone.h"
+#include "support/files.h"
 #include "tessel/record_json.h"
 #include "tessel/schema.h"
 #include "tessel/test_store.h"
@@ -23,12 +24,7 @@ namespace fs = std::filesystem;
 
 const fs::path kData = fs::path(ZT_TEST_DATA_DIR) / "data" / "ical";
 
-std::string readFile(const fs::path& path) {
-  std::ifstream in(path, std::ios::binary);
-  std::ostringstream text;
-  text << in.rdbuf();
-  return text.str();
-}
+using zt::test_support::readFile;
 
 ICalCalendar readText(const std::string& text, std::optional<std::string> title = std::nullopt) {
   ICalCalendarSource source;

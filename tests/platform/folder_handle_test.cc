@@ -11,12 +11,12 @@
 #include <vector>
 
 #include "platform/atomic_file.h"
-#include "platform/temporary_folder.h"
+#include "support/temporary_folder.h"
 
 namespace zt::platform {
 namespace {
 
-using test_support::TemporaryFolder;
+using zt::test_support::TemporaryFolder;
 namespace fs = std::filesystem;
 
 std::vector<std::uint8_t> bytesOf(std::string_view text) {

@@ -11,6 +11,7 @@
 #include <string>
 
 #include "platform/utf16.h"
+#include "support/files.h"
 #include "sync/synctool_fixture.h"
 #include "tessel/schema.h"
 
@@ -19,23 +20,10 @@ namespace {
 
 const fs::path kSamples = fs::path(ZT_TEST_DATA_DIR) / ".." / ".." / "samples";
 
-std::string readFile(const fs::path& path) {
-  std::ifstream in(path, std::ios::binary);
-  std::ostringstream text;
-  text << in.rdbuf();
-  return text.str();
-}
+using zt::test_support::readFile;
 
-// The contacts file is UTF-16BE with one byte-order mark.
 std::string readUtf16BigEndian(const fs::path& path) {
-  const std::string bytes = readFile(path);
-  std::u16string units;
-  for (std::size_t i = 0; i + 1 < bytes.size(); i += 2) {
-    units.push_back(static_cast<char16_t>((static_cast<unsigned char>(bytes[i]) << 8) |
-                                          static_cast<unsigned char>(bytes[i + 1])));
-  }
-  if (!units.empty() && units.front() == u'\xFEFF') units.erase(0, 1);
-  return platform::utf16::toUtf8(units);
+  return zt::test_support::utf8OfUtf16BigEndian(readFile(path));
 }
 
 #define EXPECT_HAS(text, part) \

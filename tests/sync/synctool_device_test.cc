@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "platform/device_library.h"
+#include "support/files.h"
 #include "sync/synctool_fixture.h"
 
 namespace zt::sync::test_support {
@@ -15,10 +16,7 @@ namespace {
 
 constexpr std::uint64_t kPlayerNumber = 0xA27001A2B3C4DULL;
 
-std::string readFile(const fs::path& path) {
-  std::ifstream in(path, std::ios::binary);
-  return std::string(std::istreambuf_iterator<char>(in), {});
-}
+using zt::test_support::readFile;
 
 using PlayerVolume = SynctoolTest;
 
