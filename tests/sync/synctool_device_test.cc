@@ -75,6 +75,9 @@ TEST_F(PlayerVolume, AVolumeThatNeverMountsIsGivenUpAfterTwentySeconds) {
 
 TEST_F(PlayerVolume, ARegularFileNamedContactsTurnsContactsOffButNotTheRun) {
   registerClient(kClientID, true, true);
+  const fs::path home =
+      fs::path(ZT_TEST_DATA_DIR) / ".." / ".." / "samples" / "calendars" / "home.ics";
+  ASSERT_EQ(runTessel({"import", "ical", home.string()}).exitStatus, 0);
   std::ofstream(volume() / "Contacts") << "not a folder";
   const SynctoolRun run = syncClient(kClientID);
   EXPECT_EQ(run.exitStatus, 0);
@@ -83,14 +86,12 @@ TEST_F(PlayerVolume, ARegularFileNamedContactsTurnsContactsOffButNotTheRun) {
   EXPECT_TRUE(fs::is_directory(volume() / "Calendars"));
   EXPECT_EQ(readFile(volume() / "Contacts"), "not a folder");
   EXPECT_EQ(run.finalStatus(), 0);
-  // Contacts are off; calendars go on unless this build has no syncer for them.
-  const bool calendarsLeftOut =
-      run.logged("No calendars syncer in this tool, calendars are left out of this sync");
-  EXPECT_EQ(run.dataClassesSyncing(), calendarsLeftOut
-                                          ? std::vector<std::string>{}
-                                          : std::vector<std::string>{"tessel.calendars"});
+  // Contacts are off, calendars go on and are written.
+  EXPECT_EQ(run.dataClassesSyncing(), std::vector<std::string>{"tessel.calendars"});
   EXPECT_FALSE(run.logged("Sync'ing Contacts"));
-  EXPECT_EQ(run.logged("Sync'ing Calendars"), !calendarsLeftOut);
+  EXPECT_TRUE(run.logged("Sync'ing Calendars")) << run.log;
+  EXPECT_NE(readFile(volume() / "Calendars" / "Tessel-Home.ics").find("BEGIN:VEVENT"),
+            std::string::npos);
   EXPECT_EQ(client(kClientID)->lastSession()->outcome, tessel::SessionOutcome::Finished);
 
   // Existing folders are used as they are.
