@@ -1,12 +1,14 @@
 // The whole product as a person uses it: address books and calendars exported by desktop and
 // web programs (the repository's samples) are imported with `tessel import`, synced onto a
 // virtual player that takes photos, and land intact; importing them again changes nothing,
-// so the next sync leaves the contacts file alone.
+// so the next sync leaves the contacts file alone. The files on the player are compared line by
+// line with golden/ (made again with ZT_UPDATE_GOLDEN=1, then checked by eye).
 
 #include <gtest/gtest.h>
 
 #include <filesystem>
 #include <fstream>
+#include <set>
 #include <sstream>
 #include <string>
 
@@ -26,11 +28,24 @@ std::string readUtf16BigEndian(const fs::path& path) {
   return zt::test_support::utf8OfUtf16BigEndian(readFile(path));
 }
 
+// Lines stamped with the time of the run are masked.
+std::string withoutTimesOfTheRun(const std::string& text) {
+  std::string out;
+  for (const std::string& line : zt::test_support::splitLines(text))
+    out += line.starts_with("DTSTAMP:") ? "DTSTAMP:(time of the run)\r\n" : line + "\n";
+  return out;
+}
+
 #define EXPECT_HAS(text, part) \
   EXPECT_NE((text).find(part), std::string::npos) << "missing: " << (part)
 
 class ImportAndSync : public SynctoolTest {
  protected:
+  // Floating times are read and written in the zone of the session, the same for both tools.
+  void SetUp() override {
+    SynctoolTest::SetUp();
+    setEnvironment("TZ", "Europe/Paris");
+  }
   void importSamples() {
     TesselRun run = runTessel({"import", "vcard",
                                (kSamples / "contacts" / "friends-and-colleagues.vcf").string(),
@@ -87,6 +102,21 @@ TEST_F(ImportAndSync, ExportedAddressBooksAndCalendarsLandIntactAndSyncOnceOnly)
   EXPECT_HAS(home, "DTSTART:20261107T080000\r\n");
   EXPECT_HAS(readFile(volume() / "Calendars" / "Tessel-Holidays.ics"),
              "SUMMARY:Summer trip to Lisbon / Porto\r\n");
+
+  // The whole files, line by line, against the reference files of golden/.
+  const fs::path golden = fs::path(ZT_TEST_DATA_DIR) / "golden";
+  EXPECT_TRUE(zt::test_support::matchesGoldenFile(golden / "Tessel.vcf", cards));
+  std::set<std::string> calendars, references;
+  for (const auto& entry : fs::directory_iterator(volume() / "Calendars"))
+    calendars.insert(entry.path().filename().string());
+  for (const std::string& name : calendars) {
+    SCOPED_TRACE(name);
+    EXPECT_TRUE(zt::test_support::matchesGoldenFile(
+        golden / name, withoutTimesOfTheRun(readFile(volume() / "Calendars" / name))));
+  }
+  for (const auto& entry : fs::directory_iterator(golden))
+    if (entry.path().extension() == ".ics") references.insert(entry.path().filename().string());
+  EXPECT_EQ(calendars, references);
 
   // The same exports again: nothing is rewritten in the store, so nothing is pushed.
   importSamples();

@@ -338,6 +338,7 @@ SynctoolTest::TesselRun SynctoolTest::runTessel(const std::vector<std::string>& 
   words.insert(words.end(), arguments.begin(), arguments.end());
   zt::test_support::ProcessOptions options;
   options.mergeErrorIntoOutput = true;
+  options.environment = environment();
   const zt::test_support::ProcessRun run = zt::test_support::runProcess(words, options);
   return {run.status, run.out};
 }

@@ -163,7 +163,8 @@ class SynctoolTest : public ::testing::Test {
     int exitStatus = -1;
     std::string output;  // standard output and standard error together
   };
-  // `tessel --store <the test's store> arguments...`, as the desktop application would run it.
+  // `tessel --store <the test's store> arguments...`, as the desktop application would run it,
+  // with the binary's environment.
   TesselRun runTessel(const std::vector<std::string>& arguments);
 
  private:
