@@ -302,26 +302,5 @@ TEST_F(CalendarsSync, AFileThePlayerRefusesEndsTheCalendarsSyncWithAWriteError) 
   EXPECT_EQ(uploadingProgress(run), (std::vector<double>{0, 34, 50.5, 100}));
 }
 
-TEST_F(CalendarsSync, ContactsAndCalendarsSyncTogetherInOneRun) {
-  tessel({"client", "register", std::string(kClientID), "--contacts", "--calendars"});
-  put({record("person", Json{{"tessel.record.entity", "tessel.contacts.Contact"},
-                             {"first name", "Ann"},
-                             {"last name", "Lee"}}),
-       calendar("cal-home", "Home", {"ev-1"}), event("ev-1", "Lunch", "2007-03-15T12:30:00")});
-
-  const SynctoolRun run = syncClient(kClientID);
-
-  EXPECT_EQ(run.finalStatus(), 0) << run.log;
-  EXPECT_TRUE(fs::exists(volume() / "Contacts" / "Tessel.vcf"));
-  EXPECT_TRUE(contains(calendarFile("Tessel-Home.ics"), "SUMMARY:Lunch\r\n"));
-  EXPECT_EQ(run.dataClassesSyncing(),
-            (std::vector<std::string>{"tessel.contacts", "tessel.calendars"}));
-  // Contacts go first; calendars follow in the same session.
-  const auto contacts = run.lineIndex("Sync'ing Contacts");
-  const auto calendars = run.lineIndex("Sync'ing Calendars");
-  ASSERT_TRUE(contacts && calendars) << run.log;
-  EXPECT_LT(*contacts, *calendars);
-}
-
 }  // namespace
 }  // namespace zt::sync::test_support
