@@ -3,28 +3,13 @@
 #include <fstream>
 
 #include "contacts/zt_contacts_syncer.h"
-#include "platform/file_system.h"
-#include "platform/run_loop.h"
-#include "platform/user_defaults.h"
-#include "platform/virtual/virtual_device_library.h"
-#include "sync/sync_services.h"
+#include "support/in_process_sync.h"
 #include "tessel/record_json.h"
 #include "tessel/schema.h"
 
 namespace zt::contacts::testing {
 
-namespace {
-
-class RecordingCenter final : public platform::NotificationCenter {
- public:
-  void post(std::string_view name, std::string_view sender,
-            const platform::Dictionary& userInfo) override {
-    posted.push_back({std::string(name), std::string(sender), userInfo});
-  }
-  std::vector<platform::Notification> posted;
-};
-
-}  // namespace
+namespace {}  // namespace
 
 bool SyncOutcome::logged(std::string_view line) const {
   return count(line) > 0;
@@ -63,20 +48,12 @@ std::string ContactsSyncTest::dataFile(std::string_view name) {
 
 SyncOutcome ContactsSyncTest::sync(PlayerPhotos photos, std::string_view defaults,
                                    SyncerMaker maker) {
-  platform::VirtualDeviceLibrary devices((folder_ / "devices.json").string());
-  RecordingCenter center;
-  const platform::UserDefaults userDefaults = platform::UserDefaults::fromText(defaults);
-  const platform::FileSystem files;
-  sync::SyncServices services{
-      devices,
-      center,
-      userDefaults,
-      files,
-      platform::RunLoop::current(),
+  zt::test_support::InProcessSync inProcess(folder_ / "devices.json", defaults);
+  sync::SyncServices services = inProcess.services(
       storePath_,
       sync::SyncerMakers{.contacts = maker ? maker : SyncerMaker(makeContactsSyncer),
                          .calendars = nullptr},
-      [photos](const std::string&) { return photos == PlayerPhotos::Accepted; }};
+      [photos](const std::string&) { return photos == PlayerPhotos::Accepted; });
 
   SyncOutcome outcome;
   {
@@ -87,7 +64,7 @@ SyncOutcome ContactsSyncTest::sync(PlayerPhotos photos, std::string_view default
   const std::string log = log_.text();
   outcome.log = zt::test_support::splitLines(std::string_view(log).substr(logOffset_));
   logOffset_ = log.size();
-  for (const platform::Notification& notification : center.posted) {
+  for (const platform::Notification& notification : inProcess.posted()) {
     const platform::Value* phase = notification.userInfo.find("TesselClientCurrentPhase");
     const platform::Value* percent =
         notification.userInfo.find("TesselClientPercentProgressionPhase");
