@@ -17,6 +17,7 @@ namespace {
 
 const std::string kUploading = "TesselClientUploadingPhase";
 
+using zt::test_support::contains;
 using zt::test_support::readFile;
 
 Json date(const std::string& wallClock, const std::string& zone = "UTC") {
@@ -66,12 +67,7 @@ class CalendarsSync : public SynctoolTest {
     return readFile(calendarsFolder() / name);
   }
   std::vector<std::string> calendarFiles() const {
-    std::vector<std::string> names;
-    for (const auto& entry : fs::directory_iterator(calendarsFolder())) {
-      names.push_back(entry.path().filename().string());
-    }
-    std::sort(names.begin(), names.end());
-    return names;
+    return zt::test_support::namesIn(calendarsFolder());
   }
 
   static std::vector<double> uploadingProgress(const SynctoolRun& run) {
@@ -86,10 +82,6 @@ class CalendarsSync : public SynctoolTest {
     return progress;
   }
 };
-
-bool contains(const std::string& text, const std::string& part) {
-  return text.find(part) != std::string::npos;
-}
 
 TEST_F(CalendarsSync, WritesOneFilePerCalendarInTheUsersOrderAndEmptiesTheFolderFirst) {
   put({calendar("cal-home", "Home", {"ev-1"}), calendar("cal-work", "Work/Office", {"ev-2"}),

@@ -51,9 +51,6 @@ std::string calendarText(const std::string& body) {
   return "BEGIN:VCALENDAR\r\nVERSION:2.0\r\nPRODID:-//Test//EN\r\n" + body + "END:VCALENDAR\r\n";
 }
 
-#define EXPECT_CONTAINS(text, part) \
-  EXPECT_NE(std::string(text).find(part), std::string::npos) << "in: " << (text)
-
 // Each export read whole: title, counts and every record as a typed JSON line, compared with
 // golden/ical/. What they pin: Outlook's Windows zone names and a moved occurrence of a
 // series, folded and escaped lines made whole; Google's alarms of every kind; zones known

@@ -21,6 +21,14 @@ void writeFile(const fs::path& path, std::string_view bytes) {
   out << bytes;
 }
 
+std::vector<std::string> namesIn(const fs::path& folder) {
+  std::vector<std::string> names;
+  for (const auto& entry : fs::directory_iterator(folder))
+    names.push_back(entry.path().filename().string());
+  std::sort(names.begin(), names.end());
+  return names;
+}
+
 std::vector<std::string> splitLines(std::string_view text) {
   std::vector<std::string> lines;
   std::istringstream in{std::string(text)};

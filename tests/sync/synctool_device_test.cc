@@ -103,14 +103,7 @@ TEST_F(PlayerVolume, ARegularFileNamedContactsTurnsContactsOffButNotTheRun) {
   EXPECT_FALSE(again.logContains("regular file"));
 }
 
-// The names in a folder, links not followed.
-std::vector<std::string> namesIn(const fs::path& folder) {
-  std::vector<std::string> names;
-  for (const auto& entry : fs::directory_iterator(folder))
-    names.push_back(entry.path().filename().string());
-  std::sort(names.begin(), names.end());
-  return names;
-}
+using zt::test_support::namesIn;
 
 TEST_F(PlayerVolume, ALinkInPlaceOfAFolderTurnsItsDataClassOffAndLeadsNowhere) {
   registerClient(kClientID, true, true);

@@ -21,9 +21,6 @@ using Outcome = zt::test_support::ProcessRun;
 using zt::test_support::readFile;
 using zt::test_support::writeFile;
 
-#define EXPECT_CONTAINS(text, part) \
-  EXPECT_NE(std::string(text).find(part), std::string::npos) << "in: " << (text)
-
 class TesselCommandTest : public ::testing::Test {
  protected:
   void SetUp() override { store_ = dir_ / "truth.db"; }
