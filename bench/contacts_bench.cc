@@ -25,10 +25,10 @@
 #include "platform/file_system.h"
 #include "platform/log.h"
 #include "platform/notification_center.h"
-#include "platform/picture_maker.h"
 #include "platform/run_loop.h"
 #include "platform/user_defaults.h"
 #include "platform/virtual/virtual_device_library.h"
+#include "support/picture_maker.h"
 #include "sync/sync_services.h"
 #include "sync/zt_sync_manager.h"
 #include "tessel/schema.h"
@@ -82,11 +82,11 @@ struct Photos {
 // Distinct pictures, cycled over the contacts that have one: the decoder's work depends on
 // size and content, not on having seen the bytes before (libvips caches no operation here).
 Photos makePhotos(int count) {
-  using zt::platform::PictureFormat;
-  using zt::platform::PicturePattern;
+  using zt::test_support::PictureFormat;
+  using zt::test_support::PicturePattern;
   Photos photos;
   for (int i = 0; i < count; ++i) {
-    zt::platform::PictureRecipe recipe;
+    zt::test_support::PictureRecipe recipe;
     if (i % 2 == 0) {  // a camera photo: large, detailed
       recipe = {.size = {640 + 16 * (i % 40), 480 + 12 * (i % 40)},
                 .pattern = PicturePattern::Noise,
@@ -96,7 +96,7 @@ Photos makePhotos(int count) {
     } else {  // a PNG: always converted
       recipe = {.size = {300 + (i % 50), 300}, .format = PictureFormat::PNG};
     }
-    std::optional<Data> bytes = zt::platform::makePicture(recipe);
+    std::optional<Data> bytes = zt::test_support::makePicture(recipe);
     if (!bytes) {
       std::fprintf(stderr, "libvips cannot make pictures\n");
       std::exit(1);

@@ -17,6 +17,7 @@
 #include "device/driver_entry_lookup.h"
 #include "platform/virtual/virtual_hardware_registry.h"
 #include "platform/virtual/virtual_scsi_pass_through.h"
+#include "support/virtual_scsi_faults.h"
 
 namespace {
 
@@ -49,9 +50,11 @@ void fuzzPages(std::span<const std::uint8_t> input) {
   const std::vector<zt::platform::VirtualPlayer> players{player};
   zt::platform::VirtualHardwareRegistry registry(players);
   VirtualScsiPassThrough passThrough(players);
+  zt::test_support::ScsiFaults faults;
+  passThrough.setFaults(&faults);
 
   Reader reader(input);
-  auto& pages = passThrough.faults().pages;
+  auto& pages = faults.pages;
   const std::vector<std::uint8_t> table = reader.bytes(reader.byte().value_or(0));
   pages[0xC0] = table;
   for (std::uint8_t code : table) {
@@ -59,7 +62,7 @@ void fuzzPages(std::span<const std::uint8_t> input) {
     if (!length) break;
     if (!pages.contains(code)) pages[code] = reader.bytes(*length);
   }
-  if (auto failing = reader.byte()) passThrough.faults().failingPages.insert(*failing);
+  if (auto failing = reader.byte()) faults.failingPages.insert(*failing);
 
   std::optional<zt::platform::RegistryEntry> driver;
   if (!zt::device::findDriverEntry(registry, "/dev/zetovirt0", zt::device::kZetoDriverClassNames,

@@ -9,6 +9,7 @@
 #include <string>
 #include <vector>
 
+#include "support/files.h"
 #include "sync/synctool_fixture.h"
 
 namespace zt::sync::test_support {
@@ -16,12 +17,8 @@ namespace {
 
 const std::string kUploading = "TesselClientUploadingPhase";
 
-std::string readFile(const fs::path& path) {
-  std::ifstream in(path, std::ios::binary);
-  std::ostringstream text;
-  text << in.rdbuf();
-  return text.str();
-}
+using zt::test_support::contains;
+using zt::test_support::readFile;
 
 Json date(const std::string& wallClock, const std::string& zone = "UTC") {
   return Json{{"$date", wallClock}, {"tz", zone}};
@@ -70,12 +67,7 @@ class CalendarsSync : public SynctoolTest {
     return readFile(calendarsFolder() / name);
   }
   std::vector<std::string> calendarFiles() const {
-    std::vector<std::string> names;
-    for (const auto& entry : fs::directory_iterator(calendarsFolder())) {
-      names.push_back(entry.path().filename().string());
-    }
-    std::sort(names.begin(), names.end());
-    return names;
+    return zt::test_support::namesIn(calendarsFolder());
   }
 
   static std::vector<double> uploadingProgress(const SynctoolRun& run) {
@@ -90,10 +82,6 @@ class CalendarsSync : public SynctoolTest {
     return progress;
   }
 };
-
-bool contains(const std::string& text, const std::string& part) {
-  return text.find(part) != std::string::npos;
-}
 
 TEST_F(CalendarsSync, WritesOneFilePerCalendarInTheUsersOrderAndEmptiesTheFolderFirst) {
   put({calendar("cal-home", "Home", {"ev-1"}), calendar("cal-work", "Work/Office", {"ev-2"}),
@@ -304,27 +292,6 @@ TEST_F(CalendarsSync, AFileThePlayerRefusesEndsTheCalendarsSyncWithAWriteError) 
   EXPECT_TRUE(calendarFiles().empty());
   // The first step is reported before the write, the closing 100 after the failure.
   EXPECT_EQ(uploadingProgress(run), (std::vector<double>{0, 34, 50.5, 100}));
-}
-
-TEST_F(CalendarsSync, ContactsAndCalendarsSyncTogetherInOneRun) {
-  tessel({"client", "register", std::string(kClientID), "--contacts", "--calendars"});
-  put({record("person", Json{{"tessel.record.entity", "tessel.contacts.Contact"},
-                             {"first name", "Ann"},
-                             {"last name", "Lee"}}),
-       calendar("cal-home", "Home", {"ev-1"}), event("ev-1", "Lunch", "2007-03-15T12:30:00")});
-
-  const SynctoolRun run = syncClient(kClientID);
-
-  EXPECT_EQ(run.finalStatus(), 0) << run.log;
-  EXPECT_TRUE(fs::exists(volume() / "Contacts" / "Tessel.vcf"));
-  EXPECT_TRUE(contains(calendarFile("Tessel-Home.ics"), "SUMMARY:Lunch\r\n"));
-  EXPECT_EQ(run.dataClassesSyncing(),
-            (std::vector<std::string>{"tessel.contacts", "tessel.calendars"}));
-  // Contacts go first; calendars follow in the same session.
-  const auto contacts = run.lineIndex("Sync'ing Contacts");
-  const auto calendars = run.lineIndex("Sync'ing Calendars");
-  ASSERT_TRUE(contacts && calendars) << run.log;
-  EXPECT_LT(*contacts, *calendars);
 }
 
 }  // namespace

@@ -11,21 +11,20 @@
 #include <sstream>
 
 #include "platform/log.h"
-#include "platform/picture_maker.h"
-#include "platform/scoped_environment.h"
-#include "platform/temporary_folder.h"
+#include "support/captured_log.h"
+#include "support/picture_maker.h"
 #include "tessel/schema.h"
 
 namespace zt::contacts {
 namespace {
 
 using platform::Data;
-using platform::PictureFormat;
-using platform::PicturePattern;
 using platform::PixelSize;
+using test_support::PictureFormat;
+using test_support::PicturePattern;
 
-Data picture(platform::PictureRecipe recipe) {
-  std::optional<Data> bytes = platform::makePicture(recipe);
+Data picture(test_support::PictureRecipe recipe) {
+  std::optional<Data> bytes = test_support::makePicture(recipe);
   EXPECT_TRUE(bytes) << "libvips could not make the test picture";
   return bytes.value_or(Data{});
 }
@@ -51,36 +50,16 @@ platform::Dictionary contact(Data image) {
 // A picture service that counts how often it is made.
 class ContactPhoto : public ::testing::Test {
  protected:
-  void SetUp() override {
-    environment_.set("ZETOSYNCTOOL_LOG", (folder_ / "log").string());
-    platform::Log::configureFromEnvironment();
-    platform::Log::setDebugEnabled(true);
-  }
-  void TearDown() override {
-    platform::Log::setDebugEnabled(false);
-    environment_.unset("ZETOSYNCTOOL_LOG");
-    platform::Log::configureFromEnvironment();
-  }
+  std::vector<std::string> log() const { return log_.lines(); }
+  bool logged(std::string_view line) const { return log_.has(line); }
 
-  std::vector<std::string> log() const {
-    std::ifstream in(folder_ / "log");
-    std::vector<std::string> lines;
-    for (std::string line; std::getline(in, line);) lines.push_back(line);
-    return lines;
-  }
-  bool logged(std::string_view line) const {
-    const std::vector<std::string> lines = log();
-    return std::find(lines.begin(), lines.end(), line) != lines.end();
-  }
-
+  zt::test_support::CapturedLog log_;
+  zt::test_support::TemporaryFolder folder_;
   ContactPhotoPreparation preparation_{[this] {
     ++servicesMade_;
     return platform::makeImageService();
   }};
   int servicesMade_ = 0;
-
-  platform::test_support::TemporaryFolder folder_;
-  platform::test_support::ScopedEnvironment environment_;
 };
 
 PixelSize sizeOf(const Data& jpeg) {
@@ -101,40 +80,56 @@ TEST_F(ContactPhoto, AJPEGOfAtMost20480BytesIsEmbeddedAsItIsWithoutImageWork) {
   EXPECT_FALSE(logged("Creating Vuro context"));
 }
 
-TEST_F(ContactPhoto, AJPEGOf20481BytesIsDecodedAndReEncoded) {
-  const Data source = paddedJPEG(20481);
-  const std::optional<Data> photo = preparation_.photoForContact(contact(source));
-  ASSERT_TRUE(photo);
-  EXPECT_NE(*photo, source);
-  EXPECT_TRUE(isJPEG(*photo));
-  EXPECT_EQ(sizeOf(*photo), (PixelSize{100, 100}));
-  EXPECT_TRUE(logged("Image size for \"Ann Lee\" is 20481l so it should be resized"));
-  EXPECT_TRUE(logged("After reducing/converting the image, size is " +
-                     std::to_string(photo->size()) + "l"));
-}
-
-TEST_F(ContactPhoto, ALargeJPEGIsScaledToFitIn256Pixels) {
-  const Data source =
-      picture({.size = {1024, 512}, .pattern = PicturePattern::Noise, .jpegQuality = 90});
-  ASSERT_GT(source.size(), 20480u);
-  const std::optional<Data> photo = preparation_.photoForContact(contact(source));
-  ASSERT_TRUE(photo);
-  EXPECT_TRUE(isJPEG(*photo));
-  EXPECT_LT(photo->size(), source.size());
-  EXPECT_EQ(sizeOf(*photo), (PixelSize{256, 128}));
-  EXPECT_TRUE(logged("Resizing to 256lx256l (x0.250000)"));
-}
-
-TEST_F(ContactPhoto, OtherFormatsAreConvertedAndKeptEvenWhenLarger) {
-  const Data source =
-      picture({.size = {100, 100}, .format = PictureFormat::PNG, .pattern = PicturePattern::Flat});
-  const std::optional<Data> photo = preparation_.photoForContact(contact(source));
-  ASSERT_TRUE(photo);
-  EXPECT_TRUE(isJPEG(*photo));
-  EXPECT_GT(photo->size(), source.size()) << "the case needs a PNG smaller than its JPEG";
-  EXPECT_EQ(sizeOf(*photo), (PixelSize{100, 100}));
-  EXPECT_TRUE(logged("Image for \"Ann Lee\" is not a JPEG file. Converting it"));
-  EXPECT_TRUE(logged("Not resizing (keeping size 100.000000x100.000000)"));
+// Pictures that become a JPEG of the given size, with the line that says why.
+TEST_F(ContactPhoto, PicturesAreReEncodedScaledOrConvertedToJPEG) {
+  const struct {
+    const char* name;
+    Data source;
+    PixelSize size;
+    std::string line;
+    int growth = 0;  // 1: the photo must be larger than its source, -1: smaller
+  } cases[] = {
+      {"JPEG of 20481 bytes",
+       paddedJPEG(20481),
+       {100, 100},
+       "Image size for \"Ann Lee\" is 20481l so it should be resized"},
+      {"large JPEG",
+       picture({.size = {1024, 512}, .pattern = PicturePattern::Noise, .jpegQuality = 90}),
+       {256, 128},
+       "Resizing to 256lx256l (x0.250000)"},
+      // Converted and kept even when larger than the source.
+      {"small PNG",
+       picture({.size = {100, 100}, .format = PictureFormat::PNG, .pattern = PicturePattern::Flat}),
+       {100, 100},
+       "Image for \"Ann Lee\" is not a JPEG file. Converting it",
+       1},
+      {"GIF",
+       picture({.size = {64, 48}, .format = PictureFormat::GIF}),
+       {64, 48},
+       "Not resizing (keeping size 64.000000x48.000000)"},
+      {"WebP",
+       picture({.size = {64, 48}, .format = PictureFormat::WebP}),
+       {64, 48},
+       "Not resizing (keeping size 64.000000x48.000000)"},
+      {"TIFF",
+       picture({.size = {64, 48}, .format = PictureFormat::TIFF}),
+       {64, 48},
+       "Not resizing (keeping size 64.000000x48.000000)"},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    const std::optional<Data> photo = preparation_.photoForContact(contact(c.source));
+    ASSERT_TRUE(photo);
+    EXPECT_NE(*photo, c.source);
+    EXPECT_TRUE(isJPEG(*photo));
+    EXPECT_EQ(sizeOf(*photo), c.size);
+    if (c.growth != 0) {
+      EXPECT_EQ(photo->size() > c.source.size(), c.growth > 0);
+    }
+    EXPECT_TRUE(logged(c.line));
+    EXPECT_TRUE(logged("After reducing/converting the image, size is " +
+                       std::to_string(photo->size()) + "l"));
+  }
 }
 
 TEST_F(ContactPhoto, ALargeJPEGWhoseReEncodingIsLargerKeepsItsSource) {
@@ -171,16 +166,6 @@ TEST_F(ContactPhoto, TheRenderingStateIsMadeOnce) {
 }
 
 // ----- pictures from the outside world -----
-
-TEST_F(ContactPhoto, EveryPhotoFormatIsConvertedToJPEG) {
-  for (PictureFormat format : {PictureFormat::GIF, PictureFormat::WebP, PictureFormat::TIFF}) {
-    const Data source = picture({.size = {64, 48}, .format = format});
-    const std::optional<Data> photo = preparation_.photoForContact(contact(source));
-    ASSERT_TRUE(photo) << static_cast<int>(format);
-    EXPECT_TRUE(isJPEG(*photo)) << static_cast<int>(format);
-    EXPECT_EQ(sizeOf(*photo), (PixelSize{64, 48})) << static_cast<int>(format);
-  }
-}
 
 void putBigEndian(Data& bytes, std::size_t at, std::uint32_t value, int width) {
   for (int i = 0; i < width; ++i) {

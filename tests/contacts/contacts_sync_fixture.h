@@ -11,8 +11,10 @@
 #include <vector>
 
 #include "platform/notification_center.h"
-#include "platform/scoped_environment.h"
-#include "platform/temporary_folder.h"
+#include "support/captured_log.h"
+#include "support/files.h"
+#include "support/scoped_environment.h"
+#include "support/temporary_folder.h"
 #include "sync/data_class_syncer.h"
 #include "sync/zt_sync_manager.h"
 #include "tessel/client.h"
@@ -23,9 +25,11 @@ namespace zt::contacts::testing {
 
 inline constexpr std::string_view kClientID = "000A27001A2B3C4D";
 
+using zt::test_support::readFile;
 // The cards of a contacts file as UTF-8, checking its byte-order mark and UTF-16BE form.
-std::string cardsOf(const std::string& fileBytes);
-std::string readFile(const std::filesystem::path& path);
+inline std::string cardsOf(const std::string& bytes) {
+  return zt::test_support::utf8OfUtf16BigEndian(bytes);
+}
 
 // Whether the virtual player takes contact pictures.
 enum class PlayerPhotos { Refused, Accepted };
@@ -48,7 +52,6 @@ struct SyncOutcome {
 class ContactsSyncTest : public ::testing::Test {
  protected:
   void SetUp() override;
-  void TearDown() override;
 
   // Puts records given as typed JSON lines.
   void put(std::string_view jsonLines);
@@ -66,16 +69,14 @@ class ContactsSyncTest : public ::testing::Test {
 
   static std::string dataFile(std::string_view name);
 
-  platform::test_support::TemporaryFolder folder_;
-  platform::test_support::ScopedEnvironment environment_;
+  zt::test_support::TemporaryFolder folder_;
+  zt::test_support::ScopedEnvironment environment_;
+  zt::test_support::CapturedLog log_;
   std::filesystem::path storePath_;
   std::unique_ptr<tessel::Store> store_;
 
  private:
   std::uintmax_t logOffset_ = 0;
 };
-
-// The first line where two CR LF texts differ, as a readable message; empty when equal.
-std::string firstDifference(std::string_view expected, std::string_view actual);
 
 }  // namespace zt::contacts::testing

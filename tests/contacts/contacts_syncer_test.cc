@@ -72,26 +72,6 @@ TEST_F(PushDecision, ASecondRunWithNothingChangedWritesNothing) {
   EXPECT_FALSE(rewritten());
 }
 
-TEST_F(PushDecision, AChangedContactIsPushed) {
-  settle();
-  put(R"({"id": "ann-phone", "record": {"tessel.record.entity": "tessel.contacts.PhoneNumber", "value": "555-0199", "type": "work"}})");
-  const SyncOutcome outcome = sync();
-  EXPECT_TRUE(outcome.logged("List of contacts to push has changed"));
-  EXPECT_NE(fileText().find("TEL;type=WORK:555-0199\r\n"), std::string::npos);
-  EXPECT_TRUE(sync().logged("Nothing to push for contacts..."));
-}
-
-TEST_F(PushDecision, AFileTouchedBehindOurBackIsPushed) {
-  settle();
-  std::filesystem::last_write_time(
-      vcfPath(), std::filesystem::last_write_time(vcfPath()) + std::chrono::seconds(3));
-  const SyncOutcome outcome = sync();
-  EXPECT_TRUE(
-      outcome.logged("Last mod date of VCF on Zeto is not the one we saved, force pushing VCF"));
-  EXPECT_TRUE(rewritten());
-  EXPECT_TRUE(sync().logged("Nothing to push for contacts..."));
-}
-
 TEST_F(PushDecision, TheSavedDateIsComparedAsAnInstant) {
   settle();
   // The same instant as the stored GMT date, written at another UTC offset (as a date set by
@@ -103,13 +83,6 @@ TEST_F(PushDecision, TheSavedDateIsComparedAsAnInstant) {
   client()->setSetting("LastModDateForVCF", platform::Value(shifted));
   EXPECT_TRUE(sync().logged("Nothing to push for contacts..."));
   EXPECT_FALSE(rewritten());
-}
-
-TEST_F(PushDecision, AMissingFileIsPushed) {
-  settle();
-  std::filesystem::remove(vcfPath());
-  EXPECT_TRUE(sync().logged("Can't get VCF attributes on Zeto, force pushing VCF"));
-  EXPECT_TRUE(std::filesystem::exists(vcfPath()));
 }
 
 TEST_F(PushDecision, APhotoSettingChangeIsPushedWithItsWording) {
@@ -127,31 +100,6 @@ TEST_F(PushDecision, APhotoSettingChangeIsPushedWithItsWording) {
   EXPECT_TRUE(off.logged(
       "Force pushing VCF because previous sync did sync contact images and we don't have to "
       "sync contact images now"));
-}
-
-TEST_F(PushDecision, TheUserDefaultPushesEveryTime) {
-  settle();
-  const SyncOutcome outcome = sync(PlayerPhotos::Refused, "AlwaysPushVCard = yes\n");
-  EXPECT_TRUE(outcome.logged("Force pushing per AlwaysPushVCard defaults"));
-  EXPECT_FALSE(outcome.logged("Nothing to push for contacts..."));
-  EXPECT_TRUE(rewritten());
-  EXPECT_TRUE(sync(PlayerPhotos::Refused, "AlwaysPushVCard = no\n")
-                  .logged("Nothing to push for contacts..."));
-}
-
-TEST_F(PushDecision, ForgottenSettingsOrAnotherToolVersionArePushed) {
-  settle();
-  client()->unsetSetting("LastModDateForVCF");
-  EXPECT_TRUE(sync().logged("Force pushing VCF file as we never noted last modification date"));
-
-  client()->unsetSetting("DidSyncContactImages");
-  EXPECT_TRUE(
-      sync().logged("Force pushing VCF to be sure we are to date with current sync tool version"));
-
-  client()->setSetting("LastSyncToolVersion", platform::Value::integer(39));
-  EXPECT_TRUE(sync().logged(
-      "Force pushing VCF to be sure we are up to date with current sync tool version"));
-  EXPECT_TRUE(sync().logged("Nothing to push for contacts..."));
 }
 
 TEST_F(PushDecision, TheFirstReasonToPushEndsTheChain) {
@@ -308,6 +256,82 @@ TEST_F(ContactGroupFilter, AGroupWithoutSubGroupsOrNoGroupAtAll) {
   ASSERT_EQ(sync().lastStatus, 0);
   EXPECT_EQ(firstNames(), (std::vector<std::string>{"One", "Two", "Three", "Four", "Five"}));
 }
+
+// Each reason to push, after a run that left nothing to do: the file is written again with
+// the line that says why, and the run after that has nothing to push.
+enum class Reason {
+  ChangedContact,
+  TouchedFile,
+  MissingFile,
+  UserDefault,
+  ForgottenDate,
+  ForgottenPhotoSetting,
+  AnotherVersion
+};
+struct PushReason {
+  const char* name;
+  Reason reason;
+  const char* line;
+};
+class PushReasons : public PushDecision, public ::testing::WithParamInterface<PushReason> {};
+
+TEST_P(PushReasons, RewriteTheFileOnceAndSayWhy) {
+  settle();
+  std::string_view defaults;
+  switch (GetParam().reason) {
+    case Reason::ChangedContact:
+      put(R"({"id": "ann-phone", "record": {"tessel.record.entity": "tessel.contacts.PhoneNumber", "value": "555-0199", "type": "work"}})");
+      break;
+    case Reason::TouchedFile:
+      std::filesystem::last_write_time(
+          vcfPath(), std::filesystem::last_write_time(vcfPath()) + std::chrono::seconds(3));
+      break;
+    case Reason::MissingFile:
+      std::filesystem::remove(vcfPath());
+      break;
+    case Reason::UserDefault:
+      defaults = "AlwaysPushVCard = yes\n";
+      break;
+    case Reason::ForgottenDate:
+      client()->unsetSetting("LastModDateForVCF");
+      break;
+    case Reason::ForgottenPhotoSetting:
+      client()->unsetSetting("DidSyncContactImages");
+      break;
+    case Reason::AnotherVersion:
+      client()->setSetting("LastSyncToolVersion", platform::Value::integer(39));
+      break;
+  }
+  const bool removed = !std::filesystem::exists(vcfPath());
+  const SyncOutcome outcome = sync(PlayerPhotos::Refused, defaults);
+  EXPECT_TRUE(outcome.logged(GetParam().line));
+  EXPECT_FALSE(outcome.logged("Nothing to push for contacts..."));
+  EXPECT_TRUE(removed ? std::filesystem::exists(vcfPath()) : rewritten());
+  if (GetParam().reason == Reason::ChangedContact) {
+    EXPECT_NE(fileText().find("TEL;type=WORK:555-0199\r\n"), std::string::npos);
+  }
+  EXPECT_TRUE(sync().logged("Nothing to push for contacts..."));
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Each, PushReasons,
+    ::testing::Values(
+        PushReason{"ChangedContact", Reason::ChangedContact,
+                   "List of contacts to push has changed"},
+        PushReason{"TouchedFile", Reason::TouchedFile,
+                   "Last mod date of VCF on Zeto is not the one we saved, force pushing VCF"},
+        PushReason{"MissingFile", Reason::MissingFile,
+                   "Can't get VCF attributes on Zeto, force pushing VCF"},
+        PushReason{"UserDefault", Reason::UserDefault,
+                   "Force pushing per AlwaysPushVCard defaults"},
+        PushReason{"ForgottenDate", Reason::ForgottenDate,
+                   "Force pushing VCF file as we never noted last modification date"},
+        PushReason{"ForgottenPhotoSetting", Reason::ForgottenPhotoSetting,
+                   "Force pushing VCF to be sure we are to date with current sync tool version"},
+        PushReason{
+            "AnotherVersion", Reason::AnotherVersion,
+            "Force pushing VCF to be sure we are up to date with current sync tool version"}),
+    [](const ::testing::TestParamInfo<PushReason>& reason) { return reason.param.name; });
 
 }  // namespace
 }  // namespace zt::contacts::testing

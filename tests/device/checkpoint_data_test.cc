@@ -11,6 +11,7 @@
 #include "device/probe_test_support.h"
 #include "platform/virtual/virtual_hardware_registry.h"
 #include "platform/virtual/virtual_scsi_pass_through.h"
+#include "support/virtual_scsi_faults.h"
 
 namespace zt::device {
 namespace {
@@ -33,6 +34,8 @@ class CheckpointTest : public ::testing::Test {
     player_.emplace(std::move(document));
     registry_.emplace(player_->players());
     passThrough_.emplace(player_->players());
+    faults_ = {};  // each player starts without faults
+    passThrough_->setFaults(&faults_);
     std::optional<platform::RegistryEntry> driver;
     ASSERT_TRUE(findDriverEntry("/dev/zetovirt0", driver));
     driver_ = std::move(driver);
@@ -45,6 +48,7 @@ class CheckpointTest : public ::testing::Test {
   const std::vector<std::uint8_t>& inquiries() { return passThrough_->trace().inquiries; }
 
   CapturedLog log_;
+  zt::test_support::ScsiFaults faults_;
 
  private:
   std::optional<VirtualPlayerFolder> player_;
@@ -78,14 +82,14 @@ TEST_F(CheckpointTest, SixtyTwoPagesAreTheMostThatAreRead) {
 
 TEST_F(CheckpointTest, TableIsCheckedWholeBeforeAnyPageIsRead) {
   usePlayer(checkpointDocument("<true/>", 3 * kPage));
-  passThrough().faults().pages[0xC0] = {0xC2, 0xC3, 0xC1};
+  faults_.pages[0xC0] = {0xC2, 0xC3, 0xC1};
   EXPECT_FALSE(read());
   EXPECT_TRUE(log_.has("Invalid Checkpoint page index #2l"));
   EXPECT_EQ(inquiries(), std::vector<std::uint8_t>{0xC0});
 
   // 0xC2 is the lowest page the table may list.
   usePlayer(checkpointDocument("<true/>", 2 * kPage));
-  passThrough().faults().pages[0xC0] = {0xC3, 0xC2};
+  faults_.pages[0xC0] = {0xC3, 0xC2};
   auto data = read();
   ASSERT_TRUE(data);
   EXPECT_EQ(inquiries(), (std::vector<std::uint8_t>{0xC0, 0xC3, 0xC2}));
@@ -95,20 +99,20 @@ TEST_F(CheckpointTest, TableIsCheckedWholeBeforeAnyPageIsRead) {
 
 TEST_F(CheckpointTest, EmptyOrFailingTableGivesNothing) {
   usePlayer(checkpointDocument("<true/>"));
-  passThrough().faults().pages[0xC0] = {};
+  faults_.pages[0xC0] = {};
   EXPECT_FALSE(read());
   EXPECT_TRUE(log_.has("0 entry in TOC"));
 
   usePlayer(checkpointDocument("<true/>"));
-  passThrough().faults().failingPages = {0xC0};
+  faults_.failingPages = {0xC0};
   EXPECT_FALSE(read());
   EXPECT_TRUE(log_.has("Error in ExecuteTaskSync"));
   EXPECT_TRUE(log_.has("Error getting first checkpoint"));
 
   // Pages that all come back empty make no document.
   usePlayer(checkpointDocument("<true/>"));
-  passThrough().faults().pages[0xC0] = {0xC2};
-  passThrough().faults().pages[0xC2] = {};
+  faults_.pages[0xC0] = {0xC2};
+  faults_.pages[0xC2] = {};
   EXPECT_FALSE(read());
   EXPECT_EQ(inquiries(), (std::vector<std::uint8_t>{0xC0, 0xC2}));
   EXPECT_FALSE(log_.has("Checkpoint data is 0l bytes long"));
@@ -117,14 +121,14 @@ TEST_F(CheckpointTest, EmptyOrFailingTableGivesNothing) {
 TEST_F(CheckpointTest, FailedMiddlePageLeavesGapFailedLastPageLosesAll) {
   const std::string document = checkpointDocument("<true/>", 3 * kPage);
   usePlayer(document);
-  passThrough().faults().failingPages = {0xC3};
+  faults_.failingPages = {0xC3};
   auto data = read();
   ASSERT_TRUE(data);
   EXPECT_EQ(textOf(*data), document.substr(0, kPage) + document.substr(2 * kPage));
   EXPECT_EQ(inquiries(), (std::vector<std::uint8_t>{0xC0, 0xC2, 0xC3, 0xC4}));
 
   usePlayer(document);
-  passThrough().faults().failingPages = {0xC4};
+  faults_.failingPages = {0xC4};
   EXPECT_FALSE(read());
   EXPECT_EQ(inquiries().size(), 4u);
 }
@@ -133,8 +137,8 @@ TEST_F(CheckpointTest, PayloadEndsWithTheTransfer) {
   // A page whose length byte claims more than a 255-byte transfer can carry: only what
   // arrived is kept.
   usePlayer(checkpointDocument("<true/>"));
-  passThrough().faults().pages[0xC0] = {0xC2};
-  passThrough().faults().pages[0xC2] = std::vector<std::uint8_t>(255, 'a');
+  faults_.pages[0xC0] = {0xC2};
+  faults_.pages[0xC2] = std::vector<std::uint8_t>(255, 'a');
   auto data = read();
   ASSERT_TRUE(data);
   EXPECT_EQ(data->size(), 251u);
@@ -161,13 +165,13 @@ TEST_F(CheckpointTest, ResourcesAreGivenBackWhateverHappens) {
   for (VirtualScsiStep step : {VirtualScsiStep::CreatePlugIn, VirtualScsiStep::CreateTask}) {
     SCOPED_TRACE(static_cast<int>(step));
     usePlayer(checkpointDocument("<true/>"));
-    passThrough().faults().failingSteps = {step};
+    faults_.failingSteps = {step};
     EXPECT_FALSE(read());
     EXPECT_EQ(passThrough().trace().exclusiveAccessHeld, 0);
     EXPECT_EQ(passThrough().trace().openPlugIns, 0);
   }
   usePlayer(checkpointDocument("<true/>", 3 * kPage));
-  passThrough().faults().failingPages = {0xC3};
+  faults_.failingPages = {0xC3};
   EXPECT_TRUE(read());
   EXPECT_EQ(passThrough().trace().exclusiveAccessHeld, 0);
   EXPECT_EQ(passThrough().trace().openPlugIns, 0);

@@ -112,7 +112,7 @@ TEST(ContactPictures, EveryFailureAnswersFalseAndEndsTheLogs) {
 TEST(ContactPictures, LinuxBackendOnThisMachineAnswersFalseForANonPlayer) {
   platform::LinuxHardwareRegistry registry;
   platform::LinuxScsiPassThrough passThrough;
-  platform::test_support::TemporaryFolder folder;
+  zt::test_support::TemporaryFolder folder;
   CapturedLog log;
   EXPECT_FALSE(deviceSupportsContactPictures(folder.path().string(), registry, passThrough));
   EXPECT_EQ(log.last(), "End of cryptic logs");
@@ -121,7 +121,7 @@ TEST(ContactPictures, LinuxBackendOnThisMachineAnswersFalseForANonPlayer) {
 
 TEST(ContactPictures, EnvironmentChoosesTheVirtualPlayers) {
   VirtualPlayerFolder player(checkpointDocument("<true/>"));
-  platform::test_support::ScopedEnvironment environment;
+  zt::test_support::ScopedEnvironment environment;
   environment.set("ZETO_VIRTUAL_DEVICES", player.writeDeviceFile().string());
   EXPECT_TRUE(deviceSupportsContactPictures(player.volume().string()));
   environment.set("ZETO_VIRTUAL_DEVICES", (player.folder() / "missing.json").string());

@@ -179,7 +179,7 @@ class FakeSysfs {
   void unbindDriver() { fs::remove(scsiDevice_ / "driver"); }
 
  private:
-  platform::test_support::TemporaryFolder folder_;
+  zt::test_support::TemporaryFolder folder_;
   fs::path scsiDevice_;
 };
 

@@ -8,11 +8,7 @@
 
 #include "device/contact_pictures.h"
 #include "device/probe_test_support.h"
-#include "platform/file_system.h"
-#include "platform/notification_center.h"
-#include "platform/run_loop.h"
-#include "platform/user_defaults.h"
-#include "platform/virtual/virtual_device_library.h"
+#include "support/in_process_sync.h"
 #include "sync/zt_sync_manager.h"
 #include "tessel/store.h"
 
@@ -24,11 +20,6 @@ using test_support::VirtualPlayerFolder;
 
 constexpr std::string_view kClientID = "000A27001A2B3C4D";
 
-class SilentNotifications final : public platform::NotificationCenter {
- public:
-  void post(std::string_view, std::string_view, const platform::Dictionary&) override {}
-};
-
 class PhotoDecisionTest : public ::testing::Test {
  protected:
   // The decision of a run against a player whose document holds `value`, or that has no
@@ -37,7 +28,7 @@ class PhotoDecisionTest : public ::testing::Test {
               std::string_view defaults = "") {
     VirtualPlayerFolder player(std::move(document));
     const auto deviceFile = player.writeDeviceFile();
-    platform::test_support::ScopedEnvironment environment;
+    zt::test_support::ScopedEnvironment environment;
     environment.set("ZETO_VIRTUAL_DEVICES", deviceFile.string());
     environment.set("XDG_RUNTIME_DIR", player.folder().string());
 
@@ -49,22 +40,13 @@ class PhotoDecisionTest : public ::testing::Test {
       if (setting)
         client->setSetting("SyncContactPicturesEnabled", platform::Value::boolean(*setting));
     }
-    platform::VirtualDeviceLibrary devices(deviceFile.string());
-    SilentNotifications notifications;
-    const platform::UserDefaults userDefaults = platform::UserDefaults::fromText(defaults);
-    platform::FileSystem files;
+    zt::test_support::InProcessSync inProcess(deviceFile, defaults);
     probes_ = 0;
-    sync::SyncServices services{devices,
-                                notifications,
-                                userDefaults,
-                                files,
-                                platform::RunLoop::current(),
-                                storePath,
-                                sync::SyncerMakers{},
-                                [this](const std::string& volumePath) {
-                                  ++probes_;
-                                  return deviceSupportsContactPictures(volumePath);
-                                }};
+    sync::SyncServices services =
+        inProcess.services(storePath, sync::SyncerMakers{}, [this](const std::string& volumePath) {
+          ++probes_;
+          return deviceSupportsContactPictures(volumePath);
+        });
     sync::ZTSyncManager manager(std::string(kClientID), std::move(services));
     EXPECT_TRUE(manager.initiateSyncSession());
     EXPECT_TRUE(manager.checkForConnectedZeto());

@@ -12,53 +12,17 @@
 #include <vector>
 
 #include "platform/log.h"
-#include "platform/scoped_environment.h"
-#include "platform/temporary_folder.h"
 #include "platform/virtual/virtual_players.h"
+#include "support/captured_log.h"
+#include "support/scoped_environment.h"
+#include "support/temporary_folder.h"
 
 namespace zt::device::test_support {
 
 namespace fs = std::filesystem;
 
-// Sends the process's log, debug lines included, to a file of the test for the life of the
-// object.
-class CapturedLog {
- public:
-  CapturedLog() : wasEnabled_(platform::Log::debugEnabled()) {
-    environment_.set("ZETOSYNCTOOL_LOG", (folder_ / "log").string());
-    platform::Log::configureFromEnvironment();
-    platform::Log::setDebugEnabled(true);
-  }
-  ~CapturedLog() {
-    platform::Log::setDebugEnabled(wasEnabled_);
-    environment_.unset("ZETOSYNCTOOL_LOG");
-    platform::Log::configureFromEnvironment();
-  }
-  CapturedLog(const CapturedLog&) = delete;
-  CapturedLog& operator=(const CapturedLog&) = delete;
-
-  std::vector<std::string> lines() const {
-    std::ifstream in(folder_ / "log", std::ios::binary);
-    std::vector<std::string> result;
-    for (std::string line; std::getline(in, line);) result.push_back(line);
-    return result;
-  }
-  bool has(std::string_view line) const {
-    for (const std::string& logged : lines()) {
-      if (logged == line) return true;
-    }
-    return false;
-  }
-  std::string last() const {
-    auto all = lines();
-    return all.empty() ? std::string() : all.back();
-  }
-
- private:
-  platform::test_support::TemporaryFolder folder_;
-  platform::test_support::ScopedEnvironment environment_;
-  bool wasEnabled_;
-};
+using zt::test_support::CapturedLog;
+using zt::test_support::writeFile;
 
 // A player's self-description: an XML property list whose "vCardWithJPEGSupported" holds
 // `value` (a whole element such as "<true/>"), padded with a filler string to at least
@@ -83,11 +47,6 @@ inline std::vector<std::uint8_t> bytesOf(std::string_view text) {
 
 inline std::string textOf(const std::vector<std::uint8_t>& bytes) {
   return std::string(bytes.begin(), bytes.end());
-}
-
-inline void writeFile(const fs::path& path, std::string_view text) {
-  std::ofstream out(path, std::ios::binary | std::ios::trunc);
-  out << text;
 }
 
 // One virtual player in a folder of the test: its volume, and its self-description when
@@ -120,7 +79,7 @@ class VirtualPlayerFolder {
   }
 
  private:
-  platform::test_support::TemporaryFolder folder_;
+  zt::test_support::TemporaryFolder folder_;
   platform::VirtualPlayer player_;
 };
 

@@ -11,6 +11,7 @@
 #include "platform/linux/linux_scsi_pass_through.h"
 #include "platform/virtual/virtual_hardware_registry.h"
 #include "platform/virtual/virtual_scsi_pass_through.h"
+#include "support/virtual_scsi_faults.h"
 
 namespace zt::device {
 namespace {
@@ -32,6 +33,8 @@ TEST(ExecuteInquiry, EachFailingStepHasItsResultAndMessage) {
   test_support::VirtualPlayerFolder player(test_support::checkpointDocument("<true/>"));
   platform::VirtualHardwareRegistry registry(player.players());
   platform::VirtualScsiPassThrough passThrough(player.players());
+  zt::test_support::ScsiFaults faults;
+  passThrough.setFaults(&faults);
   std::optional<platform::RegistryIterator> media = registry.matchingServices({"zetovirt0"});
   ASSERT_TRUE(media);
   auto nub = registry.parent(*registry.parent(*media->next()));
@@ -43,14 +46,14 @@ TEST(ExecuteInquiry, EachFailingStepHasItsResultAndMessage) {
   for (const Case& c : cases) {
     SCOPED_TRACE(static_cast<int>(c.step));
     CapturedLog log;
-    passThrough.faults().failingSteps = {c.step};
+    faults.failingSteps = {c.step};
     InquiryBuffer buffer{};
     EXPECT_EQ(executeInquiry(*device, buffer, 0xC0), c.result);
     if (c.message) {
       EXPECT_TRUE(log.has(c.message));
     }
   }
-  passThrough.faults().failingSteps.clear();
+  faults.failingSteps.clear();
   InquiryBuffer buffer;
   buffer.fill(0xAA);
   EXPECT_EQ(executeInquiry(*device, buffer, 0xC0), kInquirySuccess);
@@ -64,7 +67,7 @@ TEST(ExecuteInquiry, EachFailingStepHasItsResultAndMessage) {
 }
 
 TEST(ExecuteInquiry, NodesThatAreNotScsiDevicesFailCleanly) {
-  platform::test_support::TemporaryFolder folder;
+  zt::test_support::TemporaryFolder folder;
   test_support::writeFile(folder / "plain", "not a disk");
   for (const std::filesystem::path& node : {std::filesystem::path("/dev/null"), folder / "plain"}) {
     SCOPED_TRACE(node);

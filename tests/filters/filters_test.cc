@@ -12,6 +12,7 @@
 #include "filters/zeto_calendar_filter.h"
 #include "filters/zeto_contact_filter.h"
 #include "platform/log.h"
+#include "support/captured_log.h"
 #include "tessel/client.h"
 #include "tessel/exception.h"
 #include "tessel/filter_registry.h"
@@ -44,16 +45,6 @@ class RecordingHelper : public ContactFilterHelper, public CalendarFilterHelper 
 class FiltersTest : public ::testing::Test {
  protected:
   void SetUp() override {
-    dir_ = fs::temp_directory_path() /
-           ("filters_test_" + std::to_string(::getpid()) + "_" +
-            ::testing::UnitTest::GetInstance()->current_test_info()->name());
-    fs::remove_all(dir_);
-    fs::create_directories(dir_);
-    logPath_ = dir_ / "log.txt";
-    setenv("ZETOSYNCTOOL_LOG", logPath_.c_str(), 1);
-    platform::Log::configureFromEnvironment();
-    platform::Log::setDebugEnabled(false);
-
     store_ = tessel::Store::open(dir_ / "truth.db");
     std::string entity(tessel::TesselRecordEntityNameKey);
     store_->putRecords({
@@ -72,22 +63,16 @@ class FiltersTest : public ::testing::Test {
     snapshot_.reset();
     client_.reset();
     store_.reset();
-    unsetenv("ZETOSYNCTOOL_LOG");
-    platform::Log::configureFromEnvironment();
-    fs::remove_all(dir_);
   }
 
-  std::string logText() const {
-    std::ifstream in(logPath_);
-    return std::string(std::istreambuf_iterator<char>(in), {});
-  }
+  std::string logText() const { return log_.text(); }
 
   tessel::RecordReference ref(const std::string& id) const {
     return *snapshot_->recordReferenceForRecordIdentifier(id);
   }
 
-  fs::path dir_;
-  fs::path logPath_;
+  zt::test_support::TemporaryFolder dir_;
+  zt::test_support::CapturedLog log_{false};
   std::unique_ptr<tessel::Store> store_;
   std::unique_ptr<tessel::Client> client_;
   std::shared_ptr<tessel::Snapshot> snapshot_;

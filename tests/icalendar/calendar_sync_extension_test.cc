@@ -26,29 +26,28 @@ std::string expected(const std::string& id, const char* standard, const char* da
   return text + "END:VTIMEZONE\r\n";
 }
 
-TEST(TimeZoneBlockTest, NorthernZoneTakesStandardFromFebruaryAndDaylightFromMay) {
-  EXPECT_EQ(block(TimeZone::named("Europe/Paris").value()),
-            expected("Europe/Paris", "0100", "0200"));
-}
-
-TEST(TimeZoneBlockTest, SouthernZoneTakesDaylightFromFebruaryAndStandardFromMay) {
-  EXPECT_EQ(block(TimeZone::named("Australia/Sydney").value()),
-            expected("Australia/Sydney", "1000", "1100"));
-}
-
-TEST(TimeZoneBlockTest, ZoneWithoutDaylightTimeHasOnlyStandard) {
-  EXPECT_EQ(block(TimeZone::named("Asia/Kolkata").value()),
-            expected("Asia/Kolkata", "0530", nullptr));
-}
-
-TEST(TimeZoneBlockTest, UnnamedZonesAreNamedByTheirOffsets) {
-  const TimeZone central = TimeZone::unnamed(3600, 7200, "M3.5.0,M10.5.0/3").value();
-  EXPECT_EQ(timezoneBlockID(central), "UNKNOWN-3600-7200");
-  EXPECT_EQ(block(central), expected("UNKNOWN-3600-7200", "0100", "0200"));
-
-  const TimeZone newfoundland = TimeZone::unnamed(-12600).value();
-  EXPECT_EQ(timezoneBlockID(newfoundland), "UNKNOWN--12600-0");
-  EXPECT_EQ(block(newfoundland), expected("UNKNOWN--12600-0", "-0330", nullptr));
+// Standard time is the offset of February and daylight time that of May, the other way round
+// in the south; a zone without daylight time has only its standard block; unnamed zones are
+// named by their offsets.
+TEST(TimeZoneBlockTest, EachZoneGetsTheBlocksOfItsOffsets) {
+  const struct {
+    TimeZone zone;
+    std::string id;
+    const char* standard;
+    const char* daylight;
+  } cases[] = {
+      {TimeZone::named("Europe/Paris").value(), "Europe/Paris", "0100", "0200"},
+      {TimeZone::named("Australia/Sydney").value(), "Australia/Sydney", "1000", "1100"},
+      {TimeZone::named("Asia/Kolkata").value(), "Asia/Kolkata", "0530", nullptr},
+      {TimeZone::unnamed(3600, 7200, "M3.5.0,M10.5.0/3").value(), "UNKNOWN-3600-7200", "0100",
+       "0200"},
+      {TimeZone::unnamed(-12600).value(), "UNKNOWN--12600-0", "-0330", nullptr},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.id);
+    EXPECT_EQ(timezoneBlockID(c.zone), c.id);
+    EXPECT_EQ(block(c.zone), expected(c.id, c.standard, c.daylight));
+  }
 }
 
 }  // namespace

@@ -8,9 +8,9 @@
 #include <string>
 
 #include "platform/log.h"
-#include "platform/scoped_environment.h"
-#include "platform/temporary_folder.h"
 #include "platform/value.h"
+#include "support/scoped_environment.h"
+#include "support/temporary_folder.h"
 
 namespace zt::icalendar {
 namespace {
@@ -126,11 +126,11 @@ TEST(ValueFormsTest, ArraysJoinTheirElementsForms) {
 }
 
 TEST(ValueFormsTest, KindsWithoutAFormAreLoggedAndWrittenByDescription) {
-  platform::test_support::TemporaryFolder folder;
+  zt::test_support::TemporaryFolder folder;
   const std::string log = folder / "log";
   const Value record = platform::Dictionary{{"k", "v"}};
   {
-    platform::test_support::ScopedEnvironment environment;
+    zt::test_support::ScopedEnvironment environment;
     environment.set("ZETOSYNCTOOL_LOG", log);
     platform::Log::configureFromEnvironment();
     EXPECT_EQ(iCalendarRepresentation(record), record.description());

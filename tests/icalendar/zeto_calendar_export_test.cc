@@ -6,9 +6,9 @@
 
 #include "icalendar/icalendar_export.h"
 #include "platform/calendar_date.h"
-#include "platform/scoped_environment.h"
 #include "platform/time_zone.h"
 #include "platform/value.h"
+#include "support/scoped_environment.h"
 
 namespace zt::icalendar {
 namespace {
@@ -46,7 +46,7 @@ TEST(DateFormsTest, MidnightInGmtIsAUtcDateTime) {
 }
 
 TEST(DateFormsTest, LocalZoneDatesAreFloating) {
-  platform::test_support::ScopedEnvironment environment;
+  zt::test_support::ScopedEnvironment environment;
   environment.set("TZ", "America/New_York");
   CalendarDate date = at(2007, 3, 15, 9, 30, 0, TimeZone::local());
   EXPECT_EQ(iCalendarPropertyValueRepresentation(date), ":20070315T093000");

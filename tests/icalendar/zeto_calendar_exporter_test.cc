@@ -14,6 +14,7 @@
 #include "platform/calendar_date.h"
 #include "platform/time_zone.h"
 #include "platform/value.h"
+#include "support/files.h"
 #include "tessel/schema.h"
 
 namespace zt::icalendar {
@@ -46,38 +47,8 @@ Dictionary calendar(Array events, Array tasks = {}) {
           {k(TesselEntity_Calendars_Task), std::move(tasks)}};
 }
 
-std::vector<std::string> splitLines(const std::string& text) {
-  std::vector<std::string> lines;
-  std::size_t start = 0;
-  for (std::size_t end; (end = text.find("\r\n", start)) != std::string::npos; start = end + 2) {
-    lines.push_back(text.substr(start, end - start));
-  }
-  if (start < text.size()) lines.push_back(text.substr(start) + " (no CR LF)");
-  return lines;
-}
-
-// Compares two iCalendar texts line by line and names the first line that differs.
-testing::AssertionResult sameLines(const std::string& expected, const std::string& actual) {
-  const std::vector<std::string> want = splitLines(expected), got = splitLines(actual);
-  for (std::size_t i = 0; i < std::max(want.size(), got.size()); ++i) {
-    const std::string w = i < want.size() ? want[i] : "(end of text)";
-    const std::string g = i < got.size() ? got[i] : "(end of text)";
-    if (w != g) {
-      return testing::AssertionFailure()
-             << "line " << i + 1 << ": expected \"" << w << "\" got \"" << g << "\"";
-    }
-  }
-  if (expected != actual) return testing::AssertionFailure() << "texts differ in line ends";
-  return testing::AssertionSuccess();
-}
-
 std::string readGolden(const std::string& name) {
-  const std::string base = ZT_TEST_DATA_DIR;
-  std::ifstream in(base + "/data/" + name, std::ios::binary);
-  EXPECT_TRUE(in) << "golden file " << name << " not found under " << base;
-  std::stringstream text;
-  text << in.rdbuf();
-  return text.str();
+  return zt::test_support::readFile(std::string(ZT_TEST_DATA_DIR) + "/data/" + name);
 }
 
 class ExporterTest : public testing::Test {
@@ -109,7 +80,8 @@ TEST_F(ExporterTest, WorkCalendarMatchesGoldenFile) {
 
   std::vector<std::uint8_t> buffer{'o', 'l', 'd'};
   ZetoCalendarExporter::setupData(buffer, record);
-  EXPECT_TRUE(sameLines(readGolden("work.ics"), std::string(buffer.begin(), buffer.end())));
+  EXPECT_TRUE(zt::test_support::sameLines(readGolden("work.ics"),
+                                          std::string(buffer.begin(), buffer.end())));
   EXPECT_EQ(record, before);  // dates were written from copies
 }
 

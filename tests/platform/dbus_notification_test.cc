@@ -11,15 +11,15 @@
 
 #include "platform/linux/dbus_notification_center.h"
 #include "platform/notification_listener.h"
-#include "platform/scoped_environment.h"
-#include "platform/temporary_folder.h"
+#include "support/scoped_environment.h"
+#include "support/temporary_folder.h"
 
 namespace zt::platform {
 namespace {
 
 using namespace std::chrono_literals;
-using test_support::ScopedEnvironment;
-using test_support::TemporaryFolder;
+using zt::test_support::ScopedEnvironment;
+using zt::test_support::TemporaryFolder;
 
 // What a receiver written against the bus alone sees: the D-Bus type of every payload value.
 class RawSignalWatcher {

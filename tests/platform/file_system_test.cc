@@ -2,12 +2,12 @@
 
 #include <gtest/gtest.h>
 
-#include "platform/temporary_folder.h"
+#include "support/temporary_folder.h"
 
 namespace zt::platform {
 namespace {
 
-using test_support::TemporaryFolder;
+using zt::test_support::TemporaryFolder;
 
 class FileSystemTest : public ::testing::Test {
  protected:

@@ -11,34 +11,23 @@
 #include <vector>
 
 #include "platform/atomic_file.h"
-#include "platform/temporary_folder.h"
+#include "support/files.h"
+#include "support/temporary_folder.h"
 
 namespace zt::platform {
 namespace {
 
-using test_support::TemporaryFolder;
+using zt::test_support::TemporaryFolder;
 namespace fs = std::filesystem;
 
 std::vector<std::uint8_t> bytesOf(std::string_view text) {
   return std::vector<std::uint8_t>(text.begin(), text.end());
 }
 
+using zt::test_support::namesIn;
+using zt::test_support::writeFile;
 std::string contentsOf(const fs::path& path) {
-  std::ifstream file(path, std::ios::binary);
-  return std::string(std::istreambuf_iterator<char>(file), {});
-}
-
-void writeFile(const fs::path& path, std::string_view text) {
-  std::ofstream(path, std::ios::binary) << text;
-}
-
-// The names in a folder as the system lists them, links not followed.
-std::vector<std::string> namesIn(const fs::path& folder) {
-  std::vector<std::string> names;
-  for (const auto& entry : fs::directory_iterator(folder))
-    names.push_back(entry.path().filename().string());
-  std::sort(names.begin(), names.end());
-  return names;
+  return zt::test_support::readFile(path);
 }
 
 FolderHandle openFolder(const fs::path& path) {

@@ -14,6 +14,8 @@
 #include <thread>
 #include <vector>
 
+#include "support/captured_log.h"
+
 namespace zt::platform {
 namespace {
 
@@ -74,45 +76,14 @@ TEST(LogFormat, WideConversionsAreNotTruncated) {
 // Sends the log to a fresh file for the duration of a test and restores everything after.
 class LogSinkTest : public testing::Test {
  protected:
-  void SetUp() override {
-    char pattern[] = "/tmp/zt_log_test.XXXXXX";
-    ASSERT_NE(::mkdtemp(pattern), nullptr);
-    dir_ = pattern;
-    path_ = dir_ / "tool.log";
-    if (const char* previous = std::getenv("ZETOSYNCTOOL_LOG")) previousEnv_ = previous;
-    previousDebug_ = Log::debugEnabled();
-    useSink(path_.string());
-  }
-
-  void TearDown() override {
-    if (previousEnv_) {
-      ::setenv("ZETOSYNCTOOL_LOG", previousEnv_->c_str(), 1);
-    } else {
-      ::unsetenv("ZETOSYNCTOOL_LOG");
-    }
-    Log::configureFromEnvironment();
-    Log::setDebugEnabled(previousDebug_);
-    std::filesystem::remove_all(dir_);
-  }
-
   static void useSink(const std::string& value) {
     ::setenv("ZETOSYNCTOOL_LOG", value.c_str(), 1);
     Log::configureFromEnvironment();
   }
+  std::string contents() const { return log_.text(); }
 
-  std::string contents() const { return readFile(path_); }
-
-  static std::string readFile(const std::filesystem::path& path) {
-    std::ifstream in(path, std::ios::binary);
-    std::ostringstream text;
-    text << in.rdbuf();
-    return text.str();
-  }
-
-  std::filesystem::path dir_;
-  std::filesystem::path path_;
-  std::optional<std::string> previousEnv_;
-  bool previousDebug_ = false;
+  zt::test_support::CapturedLog log_;
+  zt::test_support::TemporaryFolder dir_;
 };
 
 TEST_F(LogSinkTest, DebugLinesFollowTheFlag) {
@@ -149,7 +120,7 @@ TEST_F(LogSinkTest, ConfigurationSwitchesBetweenSinks) {
   Log::always("three");
   EXPECT_EQ(testing::internal::GetCapturedStderr(), "three\n");
   EXPECT_EQ(contents(), "one\n");
-  EXPECT_EQ(readFile(other), "two\n");
+  EXPECT_EQ(zt::test_support::readFile(other), "two\n");
 
   // A file that cannot be opened falls back to standard error.
   useSink((dir_ / "missing" / "tool.log").string());

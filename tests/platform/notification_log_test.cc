@@ -8,14 +8,14 @@
 #include <string>
 
 #include "platform/linux/dbus_notification_center.h"
-#include "platform/scoped_environment.h"
-#include "platform/temporary_folder.h"
+#include "support/scoped_environment.h"
+#include "support/temporary_folder.h"
 
 namespace zt::platform {
 namespace {
 
-using test_support::ScopedEnvironment;
-using test_support::TemporaryFolder;
+using zt::test_support::ScopedEnvironment;
+using zt::test_support::TemporaryFolder;
 
 TEST(NotificationLog, EveryValueKindHasAJsonForm) {
   Dictionary nested;

@@ -7,14 +7,14 @@
 #include <string>
 
 #include "platform/log.h"
-#include "platform/scoped_environment.h"
-#include "platform/temporary_folder.h"
+#include "support/scoped_environment.h"
+#include "support/temporary_folder.h"
 
 namespace zt::platform {
 namespace {
 
-using test_support::ScopedEnvironment;
-using test_support::TemporaryFolder;
+using zt::test_support::ScopedEnvironment;
+using zt::test_support::TemporaryFolder;
 
 void writeFile(const std::filesystem::path& path, const std::string& text) {
   std::filesystem::create_directories(path.parent_path());

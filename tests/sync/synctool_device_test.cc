@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "platform/device_library.h"
+#include "support/files.h"
 #include "sync/synctool_fixture.h"
 
 namespace zt::sync::test_support {
@@ -15,10 +16,7 @@ namespace {
 
 constexpr std::uint64_t kPlayerNumber = 0xA27001A2B3C4DULL;
 
-std::string readFile(const fs::path& path) {
-  std::ifstream in(path, std::ios::binary);
-  return std::string(std::istreambuf_iterator<char>(in), {});
-}
+using zt::test_support::readFile;
 
 using PlayerVolume = SynctoolTest;
 
@@ -63,6 +61,9 @@ TEST_F(PlayerVolume, EventsOfAnotherPlayerDoNotEndTheWait) {
 
 TEST_F(PlayerVolume, ARegularFileNamedContactsTurnsContactsOffButNotTheRun) {
   registerClient(kClientID, true, true);
+  const fs::path home =
+      fs::path(ZT_TEST_DATA_DIR) / ".." / ".." / "samples" / "calendars" / "home.ics";
+  ASSERT_EQ(runTessel({"import", "ical", home.string()}).exitStatus, 0);
   std::ofstream(volume() / "Contacts") << "not a folder";
   const SynctoolRun run = syncClient(kClientID);
   EXPECT_EQ(run.exitStatus, 0);
@@ -71,14 +72,12 @@ TEST_F(PlayerVolume, ARegularFileNamedContactsTurnsContactsOffButNotTheRun) {
   EXPECT_TRUE(fs::is_directory(volume() / "Calendars"));
   EXPECT_EQ(readFile(volume() / "Contacts"), "not a folder");
   EXPECT_EQ(run.finalStatus(), 0);
-  // Contacts are off; calendars go on unless this build has no syncer for them.
-  const bool calendarsLeftOut =
-      run.logged("No calendars syncer in this tool, calendars are left out of this sync");
-  EXPECT_EQ(run.dataClassesSyncing(), calendarsLeftOut
-                                          ? std::vector<std::string>{}
-                                          : std::vector<std::string>{"tessel.calendars"});
+  // Contacts are off, calendars go on and are written.
+  EXPECT_EQ(run.dataClassesSyncing(), std::vector<std::string>{"tessel.calendars"});
   EXPECT_FALSE(run.logged("Sync'ing Contacts"));
-  EXPECT_EQ(run.logged("Sync'ing Calendars"), !calendarsLeftOut);
+  EXPECT_TRUE(run.logged("Sync'ing Calendars")) << run.log;
+  EXPECT_NE(readFile(volume() / "Calendars" / "Tessel-Home.ics").find("BEGIN:VEVENT"),
+            std::string::npos);
   EXPECT_EQ(client(kClientID)->lastSession()->outcome, tessel::SessionOutcome::Finished);
 
   // Existing folders are used as they are.
@@ -90,14 +89,7 @@ TEST_F(PlayerVolume, ARegularFileNamedContactsTurnsContactsOffButNotTheRun) {
   EXPECT_FALSE(again.logContains("regular file"));
 }
 
-// The names in a folder, links not followed.
-std::vector<std::string> namesIn(const fs::path& folder) {
-  std::vector<std::string> names;
-  for (const auto& entry : fs::directory_iterator(folder))
-    names.push_back(entry.path().filename().string());
-  std::sort(names.begin(), names.end());
-  return names;
-}
+using zt::test_support::namesIn;
 
 TEST_F(PlayerVolume, ALinkInPlaceOfAFolderTurnsItsDataClassOffAndLeadsNowhere) {
   registerClient(kClientID, true, true);

@@ -19,6 +19,8 @@
 
 #include "filters/filter_classes.h"
 #include "platform/device_library.h"
+#include "support/files.h"
+#include "support/process.h"
 #include "sync/zt_sync_manager.h"
 
 namespace zt::sync::test_support {
@@ -28,24 +30,9 @@ namespace {
 // A run that takes longer than this is stuck; it is killed and the test fails.
 constexpr auto kRunDeadline = std::chrono::seconds(50);
 
-std::string readFile(const fs::path& path) {
-  std::ifstream in(path, std::ios::binary);
-  std::ostringstream text;
-  text << in.rdbuf();
-  return text.str();
-}
-
-void writeFile(const fs::path& path, const std::string& text) {
-  std::ofstream out(path, std::ios::binary | std::ios::trunc);
-  out << text;
-}
-
-std::vector<std::string> splitLines(const std::string& text) {
-  std::vector<std::string> lines;
-  std::istringstream in(text);
-  for (std::string line; std::getline(in, line);) lines.push_back(line);
-  return lines;
-}
+using zt::test_support::readFile;
+using zt::test_support::splitLines;
+using zt::test_support::writeFile;
 
 }  // namespace
 
@@ -96,27 +83,17 @@ Json expectedNotification(std::string_view sender, std::string_view phase, doubl
 }
 
 void SynctoolTest::SetUp() {
-  std::string pattern = (fs::temp_directory_path() / "zt-synctool-XXXXXX").string();
-  ASSERT_NE(::mkdtemp(pattern.data()), nullptr);
-  folder_ = pattern;
   fs::create_directories(volume());
-  fs::create_directories(folder_ / "run");
+  fs::create_directories(folder() / "run");
   // The test reads the filters the tool wrote back as the tool's own classes.
   filters::registerFilterClasses();
-  store_ = tessel::Store::open(folder_ / "truth.db");
+  store_ = tessel::Store::open(folder() / "truth.db");
   setPlayers({Player(std::string(kPlayerID))});
   setDebugLog(true);
 }
 
 void SynctoolTest::TearDown() {
   store_.reset();
-  std::error_code ignored;
-  for (const auto& entry : fs::recursive_directory_iterator(folder_, ignored)) {
-    if (entry.is_directory(ignored)) {
-      fs::permissions(entry.path(), fs::perms::owner_all, fs::perm_options::add, ignored);
-    }
-  }
-  fs::remove_all(folder_, ignored);
 }
 
 std::unique_ptr<tessel::Client> SynctoolTest::registerClient(std::string_view identifier,
@@ -152,11 +129,11 @@ void SynctoolTest::setPlayers(const std::vector<Player>& players) {
 }
 
 void SynctoolTest::setDevicesFile(const std::string& json) {
-  writeFile(folder_ / "devices.json", json);
+  writeFile(folder() / "devices.json", json);
 }
 
 void SynctoolTest::setDefaults(const std::string& text) {
-  writeFile(folder_ / "defaults.conf", text);
+  writeFile(folder() / "defaults.conf", text);
 }
 
 void SynctoolTest::setDebugLog(bool on) {
@@ -165,15 +142,15 @@ void SynctoolTest::setDebugLog(bool on) {
 
 std::map<std::string, std::string> SynctoolTest::environment() const {
   std::map<std::string, std::string> env = {
-      {"HOME", folder_.string()},
-      {"XDG_RUNTIME_DIR", (folder_ / "run").string()},
-      {"XDG_CONFIG_HOME", (folder_ / "config").string()},
-      {"XDG_DATA_HOME", (folder_ / "data").string()},
-      {"TESSEL_STORE", (folder_ / "truth.db").string()},
-      {"ZETO_VIRTUAL_DEVICES", (folder_ / "devices.json").string()},
-      {"ZETOSYNCTOOL_DEFAULTS", (folder_ / "defaults.conf").string()},
-      {"ZETOSYNCTOOL_LOG", (folder_ / "log.txt").string()},
-      {"TESSEL_NOTIFICATIONS_LOG", (folder_ / "notes.jsonl").string()},
+      {"HOME", folder().string()},
+      {"XDG_RUNTIME_DIR", (folder() / "run").string()},
+      {"XDG_CONFIG_HOME", (folder() / "config").string()},
+      {"XDG_DATA_HOME", (folder() / "data").string()},
+      {"TESSEL_STORE", (folder() / "truth.db").string()},
+      {"ZETO_VIRTUAL_DEVICES", (folder() / "devices.json").string()},
+      {"ZETOSYNCTOOL_DEFAULTS", (folder() / "defaults.conf").string()},
+      {"ZETOSYNCTOOL_LOG", (folder() / "log.txt").string()},
+      {"TESSEL_NOTIFICATIONS_LOG", (folder() / "notes.jsonl").string()},
   };
   if (useSessionBus_) {
     if (const char* bus = std::getenv("DBUS_SESSION_BUS_ADDRESS")) {
@@ -310,8 +287,8 @@ SynctoolRun SynctoolTest::runSynctool(const std::vector<std::string>& arguments,
 
 SynctoolRun SynctoolTest::runWatched(const std::vector<std::string>& arguments,
                                      const std::optional<KillAt>& kill) {
-  const fs::path logPath = folder_ / "log.txt";
-  const fs::path notesPath = folder_ / "notes.jsonl";
+  const fs::path logPath = folder() / "log.txt";
+  const fs::path notesPath = folder() / "notes.jsonl";
   std::error_code ignored;
   fs::remove(logPath, ignored);
   fs::remove(notesPath, ignored);
@@ -332,7 +309,7 @@ SynctoolRun SynctoolTest::runWatched(const std::vector<std::string>& arguments,
 
   SynctoolRun run;
   const auto start = std::chrono::steady_clock::now();
-  run.exitStatus = runProgram(std::move(words), std::move(env), folder_ / "stderr.txt", kill,
+  run.exitStatus = runProgram(std::move(words), std::move(env), folder() / "stderr.txt", kill,
                               logPipe, &run.log, &run.logLineSeconds);
   run.seconds = std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
   if (logPipe >= 0) {
@@ -342,7 +319,7 @@ SynctoolRun SynctoolTest::runWatched(const std::vector<std::string>& arguments,
     run.log = readFile(logPath);
   }
   run.logLines = splitLines(run.log);
-  run.standardError = readFile(folder_ / "stderr.txt");
+  run.standardError = readFile(folder() / "stderr.txt");
   for (const std::string& line : splitLines(readFile(notesPath))) {
     if (line.empty()) continue;
     Json parsed = Json::parse(line, nullptr, false);
@@ -357,12 +334,13 @@ SynctoolRun SynctoolTest::runWatched(const std::vector<std::string>& arguments,
 }
 
 SynctoolTest::TesselRun SynctoolTest::runTessel(const std::vector<std::string>& arguments) {
-  std::vector<std::string> words = {TESSEL_BINARY, "--store", (folder_ / "truth.db").string()};
+  std::vector<std::string> words = {TESSEL_BINARY, "--store", (folder() / "truth.db").string()};
   words.insert(words.end(), arguments.begin(), arguments.end());
-  TesselRun run;
-  run.exitStatus = runProgram(std::move(words), std::nullopt, folder_ / "tessel.out");
-  run.output = readFile(folder_ / "tessel.out");
-  return run;
+  zt::test_support::ProcessOptions options;
+  options.mergeErrorIntoOutput = true;
+  options.environment = environment();
+  const zt::test_support::ProcessRun run = zt::test_support::runProcess(words, options);
+  return {run.status, run.out};
 }
 
 LockHolder::LockHolder(const std::map<std::string, std::string>& environment,

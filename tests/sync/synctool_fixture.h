@@ -14,6 +14,7 @@
 #include <utility>
 #include <vector>
 
+#include "support/temporary_folder.h"
 #include "tessel/client.h"
 #include "tessel/store.h"
 
@@ -123,7 +124,7 @@ class SynctoolTest : public ::testing::Test {
   void SetUp() override;
   void TearDown() override;
 
-  const fs::path& folder() const { return folder_; }
+  const fs::path& folder() const { return folder_.path(); }
   fs::path volume() const { return folder_ / "vol"; }
   tessel::Store& store() { return *store_; }
 
@@ -162,14 +163,15 @@ class SynctoolTest : public ::testing::Test {
     int exitStatus = -1;
     std::string output;  // standard output and standard error together
   };
-  // `tessel --store <the test's store> arguments...`, as the desktop application would run it.
+  // `tessel --store <the test's store> arguments...`, as the desktop application would run it,
+  // with the binary's environment.
   TesselRun runTessel(const std::vector<std::string>& arguments);
 
  private:
   SynctoolRun runWatched(const std::vector<std::string>& arguments,
                          const std::optional<KillAt>& kill);
 
-  fs::path folder_;
+  zt::test_support::TemporaryFolder folder_;
   std::unique_ptr<tessel::Store> store_;
   bool useSessionBus_ = false;
   std::map<std::string, std::string> overrides_;

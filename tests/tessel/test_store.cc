@@ -1,7 +1,5 @@
 #include "tessel/test_store.h"
 
-#include <unistd.h>
-
 #include <algorithm>
 
 #include "tessel/coder.h"
@@ -16,9 +14,6 @@ using zt::platform::Dictionary;
 using zt::platform::Value;
 
 void StoreTest::SetUp() {
-  char pattern[] = "/tmp/tessel-test-XXXXXX";
-  ASSERT_NE(mkdtemp(pattern), nullptr);
-  folder_ = pattern;
   storePath_ = folder_ / "store" / "truth.db";
   store_ = Store::open(storePath_);
   NameFilter::registerClass();
@@ -27,7 +22,6 @@ void StoreTest::SetUp() {
 void StoreTest::TearDown() {
   NameFilter::unregisterClass();
   store_.reset();
-  std::filesystem::remove_all(folder_);
 }
 
 Record contact(std::string id, std::string firstName, std::vector<std::string> groups) {

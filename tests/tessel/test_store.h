@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "platform/value.h"
+#include "support/temporary_folder.h"
 #include "tessel/change.h"
 #include "tessel/filtering.h"
 #include "tessel/record.h"
@@ -22,7 +23,7 @@ class StoreTest : public ::testing::Test {
   void SetUp() override;
   void TearDown() override;
 
-  std::filesystem::path folder_;
+  zt::test_support::TemporaryFolder folder_;
   std::filesystem::path storePath_;
   std::unique_ptr<Store> store_;
 };

@@ -29,15 +29,16 @@ class VirtualPlayerPages {
   VirtualPlayerPages(std::optional<Bytes> document, VirtualScsiPassThrough& owner)
       : document_(std::move(document)), owner_(owner) {}
 
-  bool fails(VirtualScsiStep step) const { return owner_.faults().failingSteps.contains(step); }
+  bool fails(VirtualScsiStep step) const {
+    return owner_.faults() && owner_.faults()->stepFails(step);
+  }
   VirtualScsiPassThrough::Trace& trace() { return owner_.mutableTrace(); }
 
   // The payload of a page; none when the player has no such page.
   std::optional<Bytes> payload(std::uint8_t page) const {
-    const auto& faults = owner_.faults();
-    if (faults.failingPages.contains(page)) return std::nullopt;
-    if (auto injected = faults.pages.find(page); injected != faults.pages.end()) {
-      return injected->second;
+    if (const VirtualScsiFaults* faults = owner_.faults()) {
+      if (faults->pageFails(page)) return std::nullopt;
+      if (auto injected = faults->injectedPage(page)) return injected;
     }
     if (!document_) return std::nullopt;
     const std::size_t count = (document_->size() + VirtualScsiPassThrough::kPagePayload - 1) /
@@ -181,7 +182,7 @@ VirtualScsiPassThrough::VirtualScsiPassThrough(std::optional<std::vector<Virtual
     : players_(std::move(players)) {}
 
 std::unique_ptr<ScsiPlugIn> VirtualScsiPassThrough::createPlugIn(const RegistryEntry& entry) {
-  if (!players_ || faults_.failingSteps.contains(VirtualScsiStep::CreatePlugIn)) return nullptr;
+  if (!players_ || (faults_ && faults_->stepFails(VirtualScsiStep::CreatePlugIn))) return nullptr;
   auto index = VirtualHardwareRegistry::playerOfNubPath(entry.path());
   if (!index || *index >= players_->size()) return nullptr;
   // The document is read when the player is opened, as a device reports what it is now.

@@ -2,10 +2,8 @@
 
 #include <cstddef>
 #include <cstdint>
-#include <map>
 #include <memory>
 #include <optional>
-#include <set>
 #include <string>
 #include <vector>
 
@@ -25,6 +23,17 @@ enum class VirtualScsiStep {
   SetTimeout,
 };
 
+// Where a test makes the players misbehave (tests/support/virtual_scsi_faults.h): a step
+// that fails, an INQUIRY page that fails or answers with other bytes (0xC0 included: its
+// payload is the list of page codes, its length the page count).
+class VirtualScsiFaults {
+ public:
+  virtual ~VirtualScsiFaults() = default;
+  virtual bool stepFails(VirtualScsiStep step) const = 0;
+  virtual bool pageFails(std::uint8_t page) const = 0;
+  virtual std::optional<std::vector<std::uint8_t>> injectedPage(std::uint8_t page) const = 0;
+};
+
 // SCSI pass-through to the virtual players. The plug-in of player N's nub
 // (VirtualHardwareRegistry) answers INQUIRY for vital product data pages from the player's
 // "checkpoint" document, split into pages of at most 251 bytes: page 0xC0 gives their count
@@ -33,15 +42,6 @@ enum class VirtualScsiStep {
 // document every INQUIRY fails.
 class VirtualScsiPassThrough final : public ScsiPassThrough {
  public:
-  // What a test changes to make a player misbehave.
-  struct Faults {
-    std::set<VirtualScsiStep> failingSteps;
-    // INQUIRY for these page codes fails.
-    std::set<std::uint8_t> failingPages;
-    // These pages answer with these payloads instead of the document's (0xC0 included: its
-    // payload is the list of page codes, its length the page count).
-    std::map<std::uint8_t, std::vector<std::uint8_t>> pages;
-  };
   // What the players were asked.
   struct Trace {
     std::vector<std::uint8_t> inquiries;  // page codes, in the order asked
@@ -56,14 +56,16 @@ class VirtualScsiPassThrough final : public ScsiPassThrough {
 
   std::unique_ptr<ScsiPlugIn> createPlugIn(const RegistryEntry& entry) override;
 
-  Faults& faults() { return faults_; }
+  // None: the players answer as their documents say. The faults outlive their use here.
+  void setFaults(const VirtualScsiFaults* faults) { faults_ = faults; }
+  const VirtualScsiFaults* faults() const { return faults_; }
   const Trace& trace() const { return trace_; }
   // For the player objects this pass-through hands out, which record into it.
   Trace& mutableTrace() { return trace_; }
 
  private:
   std::optional<std::vector<VirtualPlayer>> players_;
-  Faults faults_;
+  const VirtualScsiFaults* faults_ = nullptr;
   Trace trace_;
 };
 

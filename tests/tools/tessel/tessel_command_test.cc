@@ -175,19 +175,6 @@ TEST_F(TesselCommand, ClientSettingsAreSetShownAndUnset) {
   }
 }
 
-TEST_F(TesselCommand, UnknownClientsAreFailures) {
-  ASSERT_EQ(tessel({"init"}).status, 0);
-  for (const std::vector<std::string>& args : std::vector<std::vector<std::string>>{
-           {"client", "show", "ghost"},
-           {"session", "cancel", "ghost"},
-       }) {
-    const Outcome run = tessel(args);
-    EXPECT_EQ(run.status, 1) << args[1];
-    EXPECT_CONTAINS(run.err, "tessel: ");
-    EXPECT_CONTAINS(run.err, "ghost");
-  }
-}
-
 TEST_F(TesselCommand, ClientFiltersSelectExistingGroupsAndCalendarsOnly) {
   ASSERT_EQ(tessel({"init"}).status, 0);
   put(kCalendar + "\n" +
@@ -264,36 +251,39 @@ TEST_F(TesselCommand, SessionCancelWithNothingRunningSaysSo) {
   EXPECT_CONTAINS(run.out, "no session");
 }
 
-TEST_F(TesselCommand, CommandsOtherThanInitNeedAnExistingStore) {
-  const Outcome run = tessel({"records", "list"});
-  EXPECT_EQ(run.status, 1);
-  EXPECT_CONTAINS(run.err, "tessel: ");
-  EXPECT_FALSE(fs::exists(store_));
-}
-
-TEST_F(TesselCommand, HelpSucceedsAndUsageErrorsExitWithTwo) {
+// Failures exit with 1, usage errors with 2, both saying why on standard error; none of
+// them makes a store.
+TEST_F(TesselCommand, FailuresAndUsageErrorsExitWithTheirStatusAndSayWhy) {
+  const struct {
+    bool storeExists;
+    std::vector<std::string> args;
+    int status;
+    const char* says;
+  } cases[] = {
+      {true, {"client", "show", "ghost"}, 1, "ghost"},
+      {true, {"session", "cancel", "ghost"}, 1, "ghost"},
+      {false, {"records", "list"}, 1, "tessel: "},
+      {false, {}, 2, "tessel: "},
+      {false, {"records", "list", "--colour"}, 2, "tessel: "},
+      {false, {"client", "set", "c", "K"}, 2, "tessel: "},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(::testing::PrintToString(c.args));
+    for (const char* end : {"", "-wal", "-shm"}) fs::remove(store_.string() + end);
+    if (c.storeExists) {
+      ASSERT_EQ(tessel({"init"}).status, 0);
+    }
+    const Outcome run = tessel(c.args);
+    EXPECT_EQ(run.status, c.status);
+    EXPECT_CONTAINS(run.err, c.says);
+    EXPECT_EQ(fs::exists(store_), c.storeExists);
+  }
   for (const std::vector<std::string>& args : std::vector<std::vector<std::string>>{
-           {"--help"},
-           {"records", "put", "--help"},
-       }) {
-    const Outcome run = runRaw([&] {
-      std::vector<std::string> argv = {TESSEL_BINARY};
-      argv.insert(argv.end(), args.begin(), args.end());
-      return argv;
-    }());
-    EXPECT_EQ(run.status, 0) << args.front() << ": " << run.err;
+           {TESSEL_BINARY, "--help"}, {TESSEL_BINARY, "records", "put", "--help"}}) {
+    const Outcome run = runRaw(args);
+    EXPECT_EQ(run.status, 0) << args[1] << ": " << run.err;
     EXPECT_CONTAINS(run.out, "Usage");
   }
-  for (const std::vector<std::string>& args : std::vector<std::vector<std::string>>{
-           {},
-           {"records", "list", "--colour"},
-           {"client", "set", "c", "K"},
-       }) {
-    const Outcome run = tessel(args);
-    EXPECT_EQ(run.status, 2) << (args.empty() ? "(nothing)" : args.back());
-    EXPECT_CONTAINS(run.err, "tessel: ");
-  }
-  EXPECT_FALSE(fs::exists(store_));
 }
 
 }  // namespace

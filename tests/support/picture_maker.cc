@@ -1,11 +1,11 @@
-#include "platform/picture_maker.h"
+#include "support/picture_maker.h"
 
 #include <vips/vips.h>
 
 #include <algorithm>
 #include <memory>
 
-namespace zt::platform {
+namespace zt::test_support {
 
 namespace {
 
@@ -30,7 +30,8 @@ bool step(Owned& image, Operation operation) {
 
 std::optional<Data> makePicture(const PictureRecipe& recipe) {
   // The image service starts the library once per process.
-  if (!std::holds_alternative<std::unique_ptr<ImageService>>(makeImageService())) {
+  if (!std::holds_alternative<std::unique_ptr<platform::ImageService>>(
+          platform::makeImageService())) {
     return std::nullopt;
   }
   const int width = recipe.size.width;
@@ -126,4 +127,4 @@ std::optional<Data> makePicture(const PictureRecipe& recipe) {
   return picture;
 }
 
-}  // namespace zt::platform
+}  // namespace zt::test_support

@@ -5,7 +5,10 @@
 #include "platform/image_service.h"
 #include "platform/value.h"
 
-namespace zt::platform {
+namespace zt::test_support {
+
+using platform::Data;
+using platform::PixelSize;
 
 // WebP is written lossless, TIFF uncompressed.
 enum class PictureFormat { JPEG, PNG, GIF, WebP, TIFF };
@@ -25,4 +28,4 @@ struct PictureRecipe {
 // need pictures of known sizes and formats. None when libvips cannot start or encode.
 std::optional<Data> makePicture(const PictureRecipe& recipe);
 
-}  // namespace zt::platform
+}  // namespace zt::test_support

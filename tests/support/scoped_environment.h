@@ -6,7 +6,7 @@
 #include <optional>
 #include <string>
 
-namespace zt::platform::test_support {
+namespace zt::test_support {
 
 // Sets or unsets environment variables for the life of the object and restores the earlier
 // values afterwards, so tests do not leak settings into each other.
@@ -43,4 +43,4 @@ class ScopedEnvironment {
   std::map<std::string, std::optional<std::string>> saved_;
 };
 
-}  // namespace zt::platform::test_support
+}  // namespace zt::test_support

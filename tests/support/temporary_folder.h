@@ -7,7 +7,7 @@
 #include <string>
 #include <system_error>
 
-namespace zt::platform::test_support {
+namespace zt::test_support {
 
 // A fresh folder under $TMPDIR (or /tmp), removed with its contents at the end of the test.
 class TemporaryFolder {
@@ -36,4 +36,4 @@ class TemporaryFolder {
   std::filesystem::path path_;
 };
 
-}  // namespace zt::platform::test_support
+}  // namespace zt::test_support
