@@ -14,10 +14,10 @@
 #include "platform/log.h"
 #include "platform/notification_center.h"
 #include "platform/run_loop.h"
-#include "platform/scoped_environment.h"
-#include "platform/temporary_folder.h"
 #include "platform/user_defaults.h"
 #include "platform/virtual/virtual_device_library.h"
+#include "support/scoped_environment.h"
+#include "support/temporary_folder.h"
 #include "sync/sync_services.h"
 #include "sync/sync_status.h"
 #include "sync/zt_sync_manager.h"
@@ -67,8 +67,8 @@ class MountGiveUp : public ::testing::Test {
     platform::Log::configureFromEnvironment();
   }
 
-  platform::test_support::TemporaryFolder folder_;
-  platform::test_support::ScopedEnvironment environment_;
+  test_support::TemporaryFolder folder_;
+  test_support::ScopedEnvironment environment_;
 };
 
 TEST_F(MountGiveUp, AVolumeThatNeverMountsIsGivenUpAfterTheWait) {
