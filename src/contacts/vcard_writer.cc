@@ -1,5 +1,6 @@
 #include "contacts/vcard_writer.h"
 
+#include <algorithm>
 #include <string_view>
 #include <unordered_set>
 
@@ -160,13 +161,31 @@ void VCardWriter::appendOrganisation(std::string& card, const platform::Dictiona
 
 void VCardWriter::appendRelated(std::string& card, const platform::Dictionary& contact) {
   // Every list the contact holds names related records, its groups included; a record
-  // linked twice is written once.
+  // linked twice is written once. The records of one list are visited in the order the
+  // snapshot's map yields them: by identifier.
   std::unordered_set<std::string> visited;
   for (const auto& [key, value] : contact) {
-    const std::vector<std::string> identifiers = platform::stringsIn(&value);
+    std::vector<std::string> identifiers = platform::stringsIn(&value);
     if (identifiers.empty()) continue;
-    for (const auto& [identifier, record] : snapshot_.recordsWithIdentifiers(identifiers)) {
-      if (!visited.insert(identifier).second) continue;
+    std::sort(identifiers.begin(), identifiers.end());
+    identifiers.erase(std::unique(identifiers.begin(), identifiers.end()), identifiers.end());
+    // A group is named by many contacts and carries all its members: its name is read from
+    // the snapshot once per run, not once per member.
+    std::vector<std::string> unknown;
+    for (const std::string& identifier : identifiers) {
+      if (!groupNames_.contains(identifier)) unknown.push_back(identifier);
+    }
+    const tessel::RecordMap fetched =
+        unknown.empty() ? tessel::RecordMap() : snapshot_.recordsWithIdentifiers(unknown);
+    for (const std::string& identifier : identifiers) {
+      if (auto group = groupNames_.find(identifier); group != groupNames_.end()) {
+        if (!visited.insert(identifier).second) continue;
+        if (group->second) categories_.push_back(*group->second);
+        continue;
+      }
+      auto found = fetched.find(identifier);
+      if (found == fetched.end() || !visited.insert(identifier).second) continue;
+      const platform::Dictionary& record = found->second;
       const std::string* entity = textOf(record, TesselRecordEntityNameKey);
       if (!entity) continue;
       if (*entity == TesselEntity_Contacts_IM) {
@@ -180,9 +199,10 @@ void VCardWriter::appendRelated(std::string& card, const platform::Dictionary& c
       } else if (*entity == TesselEntity_Contacts_URL) {
         appendUrl(card, record);
       } else if (*entity == TesselEntity_Contacts_Group) {
-        if (const std::string* name = textOf(record, TesselAttribute_Contacts_Group_Name)) {
-          categories_.push_back(*name);
-        }
+        std::optional<std::string>& name = groupNames_[identifier];
+        if (const std::string* text = textOf(record, TesselAttribute_Contacts_Group_Name))
+          name = *text;
+        if (name) categories_.push_back(*name);
       }
     }
   }

@@ -1,7 +1,9 @@
 #pragma once
 
 #include <functional>
+#include <optional>
 #include <string>
+#include <unordered_map>
 #include <vector>
 
 #include "contacts/contact_photo.h"
@@ -42,6 +44,9 @@ class VCardWriter {
   // Reused by every value and every card.
   std::string escaped_;
   std::vector<std::string> categories_;
+  // The names of the groups met so far (none for a group without a name); the snapshot does
+  // not change during a run.
+  std::unordered_map<std::string, std::optional<std::string>> groupNames_;
 };
 
 }  // namespace zt::contacts
