@@ -349,4 +349,8 @@ std::variant<std::unique_ptr<ImageService>, ImageServiceFailure> makeImageServic
   }
 }
 
+std::string_view imageServiceIdentity() {
+  return "libvips " VIPS_VERSION;
+}
+
 }  // namespace zt::platform
