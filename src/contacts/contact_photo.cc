@@ -207,7 +207,10 @@ void ContactPhotoPreparation::prefetch(std::span<const platform::Data* const> pi
   worker();
   helpers.clear();
   for (std::size_t i = 0; i < work.size(); ++i) {
-    if (found[i]) prefetched_.insert_or_assign(work[i]->data(), std::move(*found[i]));
+    if (found[i]) {
+      prefetched_.insert_or_assign(work[i]->data(),
+                                   Prefetched{work[i]->size(), std::move(*found[i])});
+    }
   }
 }
 
@@ -220,7 +223,7 @@ std::optional<PhotoConversion> ContactPhotoPreparation::conversionFor(
     const platform::Data& picture) {
   std::optional<PhotoConversion> known;
   if (auto it = prefetched_.find(picture.data()); it != prefetched_.end()) {
-    known = std::move(it->second);
+    if (it->second.size == picture.size()) known = std::move(it->second.conversion);
     prefetched_.erase(it);
   }
   PhotoKey key{};

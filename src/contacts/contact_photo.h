@@ -76,8 +76,14 @@ class ContactPhotoPreparation {
   std::optional<platform::ImageServiceFailure> unloggedFailure_;
   // Whether "Creating Vuro context" has been logged and answered with a service.
   bool serviceAnnounced_ = false;
-  // What prefetch() found, by the address of the picture's bytes.
-  std::unordered_map<const std::uint8_t*, PhotoConversion> prefetched_;
+  // What prefetch() found, by the address of the picture's bytes, with their size: a card
+  // left unwritten by a cancelled run never hands its conversion to other bytes of another
+  // size at the same address.
+  struct Prefetched {
+    std::size_t size = 0;
+    PhotoConversion conversion;
+  };
+  std::unordered_map<const std::uint8_t*, Prefetched> prefetched_;
 };
 
 }  // namespace zt::contacts
