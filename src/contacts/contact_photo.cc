@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <atomic>
 #include <cmath>
+#include <system_error>
 #include <thread>
 #include <utility>
 #include <vector>
@@ -203,7 +204,11 @@ void ContactPhotoPreparation::prefetch(std::span<const platform::Data* const> pi
     count = std::clamp<std::size_t>(std::thread::hardware_concurrency(), 1, work.size());
   }
   std::vector<std::jthread> helpers;
-  for (std::size_t i = 1; i < count; ++i) helpers.emplace_back(worker);
+  try {
+    for (std::size_t i = 1; i < count; ++i) helpers.emplace_back(worker);
+  } catch (const std::system_error&) {
+    // Fewer threads convert the same pictures.
+  }
   worker();
   helpers.clear();
   for (std::size_t i = 0; i < work.size(); ++i) {
