@@ -1,7 +1,9 @@
 // The contacts sync at scale: 10,000 contacts with four related records each, 1,000 of them
 // with a photo (half JPEGs over 20 KiB, a quarter small JPEGs, a quarter PNGs), synced to a
 // virtual player by the real sync manager, and the same photos through ImageMagick's
-// `convert -thumbnail 256x256` in the same run for comparison.
+// `convert -thumbnail 256x256` in the same run for comparison. The photo cache is measured
+// by a second push of the same photos against the first, and the conversion of the photos on
+// one thread against prefetching them on every core.
 //
 //   contacts_bench [--contacts N] [--photos N] [--no-convert]
 #include <fcntl.h>
@@ -16,8 +18,10 @@
 #include <cstring>
 #include <filesystem>
 #include <fstream>
+#include <iterator>
 #include <map>
 #include <string>
+#include <thread>
 #include <vector>
 
 #include "contacts/contact_photo.h"
@@ -245,6 +249,8 @@ int main(int argc, char* argv[]) {
                                          << (folder / "vol").string() << R"(", "mounted": true}])";
   setenv("XDG_RUNTIME_DIR", folder.c_str(), 1);
   setenv("ZETOSYNCTOOL_LOG", (folder / "log").c_str(), 1);
+  // The photo cache of the syncs, empty at the start.
+  setenv("XDG_CACHE_HOME", (folder / "cache").c_str(), 1);
   zt::platform::Log::configureFromEnvironment();
 
   std::printf("contacts_bench: %d contacts with 4 related records each, %d photos\n", contactCount,
@@ -300,6 +306,24 @@ int main(int argc, char* argv[]) {
               withPhotos.cards - plain.cards);
   const long rssPhotos = peakResidentKiB();
 
+  // 3b. The same photos pushed again (the file on the player is gone): every photo from the
+  // cache; the file must be the same bytes.
+  const fs::path vcf = folder / "vol" / "Contacts" / "Tessel.vcf";
+  const auto fileBytes = [](const fs::path& path) {
+    std::ifstream in(path, std::ios::binary);
+    return std::string(std::istreambuf_iterator<char>(in), {});
+  };
+  const std::string firstFile = fileBytes(vcf);
+  fs::remove(vcf);
+  const SyncTimes again = runSync(folder, storePath, true);
+  std::printf("second push of the same photos (status %d, %s file)\n", again.status,
+              fileBytes(vcf) == firstFile ? "same" : "DIFFERENT");
+  std::printf("  cards with photos %.2f s, of which photos ~%.2f s\n", again.cards,
+              again.cards - plain.cards);
+  std::printf("  ratio first / second push:  cards %.1fx, photos %.1fx\n",
+              withPhotos.cards / again.cards,
+              (withPhotos.cards - plain.cards) / std::max(1e-6, again.cards - plain.cards));
+
   // 4. The photos alone, as the card writer prepares them.
   Photos photos;
   tessel::Store::open(storePath)->forEachRecord(
@@ -323,6 +347,33 @@ int main(int argc, char* argv[]) {
   std::printf("\nphoto preparation (libvips, shrink-on-load): %zu photos in %.2f s\n", prepared,
               ours);
   std::printf("  photos/s:                   %.0f\n", photoCount / ours);
+
+  // The same photos prefetched on every core, then asked for card by card.
+  using Threads = zt::contacts::ContactPhotoPreparation::Threads;
+  const auto prefetchedRun = [&](std::unique_ptr<zt::contacts::PhotoCache> cache, Threads threads) {
+    zt::contacts::ContactPhotoPreparation prefetching(zt::platform::makeImageService,
+                                                      std::move(cache), threads);
+    std::vector<const Data*> pictures;
+    for (const Dictionary& contact : photoContacts) {
+      pictures.push_back(contact.dataAt(tessel::TesselAttribute_Contacts_Contact_Image));
+    }
+    const Clock::time_point from = Clock::now();
+    prefetching.prefetch(pictures);
+    for (const Dictionary& contact : photoContacts) prefetching.photoForContact(contact);
+    prefetching.finishRun();
+    return seconds(Clock::now() - from);
+  };
+  const double parallel = prefetchedRun(nullptr, Threads::AllCores);
+  std::printf("  prefetched on %u threads:     %.2f s, ratio one thread / all: %.1fx\n",
+              std::thread::hardware_concurrency(), parallel, ours / parallel);
+  const fs::path benchCache = folder / "bench-cache";
+  const double cold = prefetchedRun(zt::contacts::PhotoCache::open(benchCache), Threads::AllCores);
+  const double warm = prefetchedRun(zt::contacts::PhotoCache::open(benchCache), Threads::AllCores);
+  const double warmOne = prefetchedRun(zt::contacts::PhotoCache::open(benchCache), Threads::One);
+  std::printf("  with the cache, all threads: first %.2f s, again %.3f s (one thread %.3f s)\n",
+              cold, warm, warmOne);
+  std::printf("  ratio no cache one thread / cache hit: %.0fx; first / again: %.0fx\n", ours / warm,
+              cold / warm);
 
   if (compare) {
     const fs::path pictures = folder / "pictures";

@@ -1,4 +1,6 @@
 // The file image of the contacts: one card per selected contact of truth.
+#include <vector>
+
 #include "contacts/vcard_writer.h"
 #include "contacts/zt_contacts_syncer.h"
 #include "platform/log.h"
@@ -24,6 +26,13 @@ bool ZTContactsSyncer::isSelected(const platform::Dictionary& contact) {
   return false;
 }
 
+namespace {
+
+// How many cards have their pictures converted together.
+constexpr std::size_t kPhotoBatch = 512;
+
+}  // namespace
+
 bool ZTContactsSyncer::disassembleData() {
   Log::debug("Disassembling data");
   _allVCardData.clear();
@@ -39,20 +48,45 @@ bool ZTContactsSyncer::disassembleData() {
     tessel::Session& session = *_syncManager.syncSession();
     std::string card;
     std::size_t written = 0;
+    bool photosUsed = false;
+    // The selected contacts are written a batch at a time, after their pictures have been
+    // converted together; the photo setting is asked only once a card is to be written.
+    std::vector<const platform::Dictionary*> batch;
+    std::vector<const platform::Data*> pictures;
+    auto writeBatch = [&]() -> bool {
+      if (batch.empty()) return true;
+      if (_syncManager.shouldSyncContactImages()) {
+        photosUsed = true;
+        pictures.clear();
+        for (const platform::Dictionary* contact : batch) {
+          pictures.push_back(contact->dataAt(tessel::TesselAttribute_Contacts_Contact_Image));
+        }
+        ContactPhotoPreparation::shared().prefetch(pictures);
+      }
+      for (const platform::Dictionary* contact : batch) {
+        card.clear();
+        writer.appendCard(card, *contact);
+        // One byte-order mark opens the file; the cards follow each other without one.
+        if (written == 0) _allVCardData += "\xFE\xFF";
+        platform::utf16::appendBigEndian(_allVCardData, card);
+        ++written;
+        if (session.isCancelled()) {
+          Log::debug("Sync session is cancelled");
+          _syncManager.setLastStatus(sync::kStatusCancelled);
+          return false;
+        }
+      }
+      batch.clear();
+      return true;
+    };
     for (const auto& [identifier, contact] : contacts) {
       if (!isSelected(contact)) continue;
-      card.clear();
-      writer.appendCard(card, contact);
-      // One byte-order mark opens the file; the cards follow each other without one.
-      if (written == 0) _allVCardData += "\xFE\xFF";
-      platform::utf16::appendBigEndian(_allVCardData, card);
-      ++written;
-      if (session.isCancelled()) {
-        Log::debug("Sync session is cancelled");
-        _syncManager.setLastStatus(sync::kStatusCancelled);
-        return false;
-      }
+      batch.push_back(&contact);
+      if (batch.size() == kPhotoBatch && !writeBatch()) return false;
     }
+    if (!writeBatch()) return false;
+    // The pictures of this push are all the photo cache keeps.
+    if (photosUsed) ContactPhotoPreparation::shared().finishRun();
     Log::debug("Effectively stored %ul contacts on Zeto", written);
     return true;
   } catch (const tessel::Exception& exception) {

@@ -4,6 +4,7 @@
 #include <memory>
 #include <optional>
 #include <span>
+#include <string_view>
 #include <variant>
 
 #include "platform/value.h"
@@ -55,5 +56,9 @@ class ImageService {
 
 // A libvips service. The library is started once per process, at the first call.
 std::variant<std::unique_ptr<ImageService>, ImageServiceFailure> makeImageService();
+
+// The library and version that makeImageService() decodes and encodes with, fixed when the
+// tool is built: what a kept conversion depends on besides the picture.
+std::string_view imageServiceIdentity();
 
 }  // namespace zt::platform

@@ -28,6 +28,8 @@ void ContactsSyncTest::SetUp() {
                          << (folder_ / "vol").string() << R"(", "mounted": true}])";
   environment_.set("ZETO_VIRTUAL_DEVICES", devices.string());
   environment_.set("XDG_RUNTIME_DIR", folder_.path().string());
+  // The photo cache of the process stays out of the user's own.
+  environment_.set("XDG_CACHE_HOME", (folder_ / "cache").string());
 
   storePath_ = folder_ / "truth.db";
   store_ = tessel::Store::open(storePath_);

@@ -1,0 +1,92 @@
+#pragma once
+
+#include <array>
+#include <cstdint>
+#include <filesystem>
+#include <memory>
+#include <mutex>
+#include <optional>
+#include <set>
+#include <span>
+#include <string>
+
+#include "platform/folder_handle.h"
+#include "platform/image_service.h"
+#include "platform/value.h"
+
+namespace zt::contacts {
+
+// What converting one picture gave, and the values its log lines are formatted from, so that
+// a picture converted in an earlier run (or on another thread) logs the very lines a
+// conversion made now would log.
+struct PhotoConversion {
+  enum class Outcome : std::uint8_t {
+    Invalid = 1,   // not decodable, or no pixels: nothing embedded
+    ScaleFailed,   // the picture itself embedded
+    RenderFailed,  // the picture itself embedded
+    EncodeFailed,  // nothing embedded
+    Larger,        // the re-encoded JPEG was larger: the picture itself embedded
+    Reduced,       // `reduced` embedded
+  };
+
+  Outcome outcome = Outcome::Invalid;
+  platform::PixelSize extent;
+  // The single-precision scale factor (1 when the picture was not scaled).
+  float factor = 1.0f;
+  // The size of the re-encoded JPEG, for Larger and Reduced.
+  std::uint64_t reducedSize = 0;
+  // The re-encoded JPEG, for Reduced only.
+  platform::Data reduced;
+
+  bool operator==(const PhotoConversion&) const = default;
+};
+
+// Whether the outcome is the same whenever the same bytes are converted again, so that it
+// may be kept: the failures of the encoder and of scaling may be passing ones.
+bool isLasting(const PhotoConversion& conversion);
+
+using PhotoKey = std::array<std::uint8_t, 32>;
+
+// Converted pictures kept between runs, one file per picture in one folder, named by the
+// SHA-256 of the picture's bytes and of everything else the conversion depends on. Entries
+// are written to a temporary file and renamed, never through a symbolic link and never
+// outside the folder; an entry that cannot be read or does not hold what its name says is
+// treated as missing and written again. At the end of a run that used the cache, prune()
+// removes the entries the run did not use, then the oldest names until the size cap holds.
+// Every method may be called from several threads at once.
+class PhotoCache {
+ public:
+  // The cache under $XDG_CACHE_HOME (or ~/.cache) in zetosynctool/photos, created when
+  // missing; none when it cannot be opened, and photos are then converted every time.
+  static std::unique_ptr<PhotoCache> openUserCache();
+  // The cache in `folder`, created when missing (its parent must exist).
+  static std::unique_ptr<PhotoCache> open(const std::filesystem::path& folder,
+                                          std::uint64_t sizeCap = kDefaultSizeCap);
+
+  // The key of `picture` for this build's conversion.
+  static PhotoKey keyFor(std::span<const std::uint8_t> picture);
+
+  std::optional<PhotoConversion> find(const PhotoKey& key);
+  // Keeps a lasting conversion; failures to write are ignored.
+  void store(const PhotoKey& key, const PhotoConversion& conversion);
+  // Removes the entries neither found nor stored since the cache was opened or last pruned,
+  // and then entries until the rest fits the size cap.
+  void prune();
+
+  const std::filesystem::path& path() const { return folder_.path(); }
+
+  static constexpr std::uint64_t kDefaultSizeCap = std::uint64_t{256} << 20;
+  // Raised whenever the conversion changes what it makes from the same bytes.
+  static constexpr std::uint32_t kConversionVersion = 1;
+
+ private:
+  PhotoCache(platform::FolderHandle folder, std::uint64_t sizeCap);
+  void touch(const std::string& name);
+
+  platform::FolderHandle folder_;
+  std::uint64_t sizeCap_;
+  std::mutex mutex_;
+  std::set<std::string> used_;
+};
+
+}  // namespace zt::contacts

@@ -1,0 +1,178 @@
+// Converted photos kept between runs and converted ahead on several threads: whatever the
+// path, a card gets the same bytes and the same log lines as a conversion made there and then.
+#include "contacts/photo_cache.h"
+
+#include <gtest/gtest.h>
+
+#include <filesystem>
+#include <fstream>
+#include <vector>
+
+#include "contacts/contact_photo.h"
+#include "support/captured_log.h"
+#include "support/picture_maker.h"
+#include "support/temporary_folder.h"
+#include "tessel/schema.h"
+
+namespace zt::contacts {
+namespace {
+
+namespace fs = std::filesystem;
+using platform::Data;
+using test_support::PictureFormat;
+using test_support::PicturePattern;
+
+Data picture(test_support::PictureRecipe recipe) {
+  std::optional<Data> bytes = test_support::makePicture(recipe);
+  EXPECT_TRUE(bytes) << "libvips could not make the test picture";
+  return bytes.value_or(Data{});
+}
+
+platform::Dictionary contact(std::string name, Data image) {
+  return platform::Dictionary{
+      {tessel::TesselRecordEntityNameKey, tessel::TesselEntity_Contacts_Contact},
+      {tessel::TesselAttribute_Contacts_Contact_FirstName, std::move(name)},
+      {tessel::TesselAttribute_Contacts_Contact_Image, std::move(image)},
+  };
+}
+
+// One picture of each way a conversion ends, and one that needs none.
+std::vector<platform::Dictionary> contacts() {
+  std::vector<platform::Dictionary> all;
+  all.push_back(
+      contact("Scaled",
+              picture({.size = {900, 600}, .pattern = PicturePattern::Noise, .jpegQuality = 95})));
+  all.push_back(contact("Png", picture({.size = {40, 30}, .format = PictureFormat::PNG})));
+  all.push_back(
+      contact("Larger",
+              picture({.size = {256, 256}, .pattern = PicturePattern::Noise, .jpegQuality = 55})));
+  all.push_back(contact("Garbage", Data(30000, 0x42)));
+  all.push_back(contact("Small", picture({.size = {20, 20}})));
+  return all;
+}
+
+// The photos and the log of one run over the contacts.
+struct PhotoRun {
+  std::vector<std::optional<Data>> photos;
+  std::vector<std::string> log;
+  int servicesMade = 0;
+};
+
+enum class Prefetch { No, Yes };
+
+PhotoRun run(const std::vector<platform::Dictionary>& cards, std::unique_ptr<PhotoCache> cache,
+             Prefetch prefetch, ContactPhotoPreparation::Threads threads,
+             bool serviceFails = false) {
+  PhotoRun result;
+  test_support::CapturedLog log;
+  ContactPhotoPreparation preparation(
+      [&]()
+          -> std::variant<std::unique_ptr<platform::ImageService>, platform::ImageServiceFailure> {
+        ++result.servicesMade;
+        if (serviceFails) return platform::ImageServiceFailure::NoRenderingContext;
+        return platform::makeImageService();
+      },
+      std::move(cache), threads);
+  if (prefetch == Prefetch::Yes) {
+    std::vector<const Data*> pictures;
+    for (const auto& card : cards) {
+      pictures.push_back(card.dataAt(tessel::TesselAttribute_Contacts_Contact_Image));
+    }
+    preparation.prefetch(pictures);
+  }
+  for (const auto& card : cards) result.photos.push_back(preparation.photoForContact(card));
+  preparation.finishRun();
+  result.log = log.lines();
+  return result;
+}
+
+std::vector<fs::path> entriesIn(const fs::path& folder) {
+  std::vector<fs::path> entries;
+  for (const auto& entry : fs::directory_iterator(folder)) entries.push_back(entry.path());
+  return entries;
+}
+
+class PhotoCacheTest : public ::testing::Test {
+ protected:
+  std::unique_ptr<PhotoCache> cache() { return PhotoCache::open(folder_.path() / "photos"); }
+
+  test_support::TemporaryFolder folder_;
+  const std::vector<platform::Dictionary> cards_ = contacts();
+  const PhotoRun converted_ =
+      run(cards_, nullptr, Prefetch::No, ContactPhotoPreparation::Threads::One);
+};
+
+TEST_F(PhotoCacheTest, EveryPathGivesTheBytesAndLinesOfAConversion) {
+  ASSERT_EQ(converted_.servicesMade, 1);
+  ASSERT_TRUE(converted_.photos[0]);
+  ASSERT_EQ(converted_.photos[2],
+            *cards_[2].dataAt(tessel::TesselAttribute_Contacts_Contact_Image));
+  ASSERT_FALSE(converted_.photos[3]);
+
+  const PhotoRun first =
+      run(cards_, cache(), Prefetch::Yes, ContactPhotoPreparation::Threads::AllCores);
+  EXPECT_EQ(first.photos, converted_.photos);
+  EXPECT_EQ(first.log, converted_.log);
+  // Scaled, Png, Larger and Garbage.
+  EXPECT_EQ(entriesIn(folder_.path() / "photos").size(), 4u);
+
+  for (Prefetch prefetch : {Prefetch::No, Prefetch::Yes}) {
+    const PhotoRun again =
+        run(cards_, cache(), prefetch, ContactPhotoPreparation::Threads::AllCores);
+    EXPECT_EQ(again.photos, converted_.photos);
+    EXPECT_EQ(again.log, converted_.log);
+    EXPECT_EQ(again.servicesMade, 0) << "every picture comes from the cache";
+  }
+}
+
+TEST_F(PhotoCacheTest, DamagedEntriesAndLinksAreConvertedAgainAndReplaced) {
+  run(cards_, cache(), Prefetch::No, ContactPhotoPreparation::Threads::One);
+  std::vector<fs::path> entries = entriesIn(folder_.path() / "photos");
+  ASSERT_EQ(entries.size(), 4u);
+  // One entry cut short, one garbage, one a link to a file outside the folder.
+  fs::resize_file(entries[0], fs::file_size(entries[0]) / 2);
+  std::ofstream(entries[1], std::ios::trunc) << "ZTPHOTO1 not an entry";
+  const fs::path outside = folder_.path() / "outside";
+  fs::copy_file(entries[2], outside);
+  const auto outsideBytes = fs::file_size(outside);
+  fs::remove(entries[2]);
+  fs::create_symlink(outside, entries[2]);
+
+  const PhotoRun again =
+      run(cards_, cache(), Prefetch::Yes, ContactPhotoPreparation::Threads::AllCores);
+  EXPECT_EQ(again.photos, converted_.photos);
+  EXPECT_EQ(again.log, converted_.log);
+  EXPECT_EQ(again.servicesMade, 1);
+  for (const fs::path& entry : entriesIn(folder_.path() / "photos")) {
+    EXPECT_TRUE(fs::is_regular_file(fs::symlink_status(entry))) << entry;
+  }
+  EXPECT_EQ(fs::file_size(outside), outsideBytes);
+  EXPECT_EQ(run(cards_, cache(), Prefetch::No, ContactPhotoPreparation::Threads::One).servicesMade,
+            0);
+}
+
+TEST_F(PhotoCacheTest, ARunKeepsOnlyThePicturesItUsedWithinTheCap) {
+  run(cards_, cache(), Prefetch::No, ContactPhotoPreparation::Threads::One);
+  std::ofstream(folder_.path() / "photos" / ".0123.tmp99.1") << "left by a killed run";
+  const std::vector<platform::Dictionary> fewer(cards_.begin(), cards_.begin() + 2);
+  run(fewer, cache(), Prefetch::Yes, ContactPhotoPreparation::Threads::One);
+  EXPECT_EQ(entriesIn(folder_.path() / "photos").size(), 2u);
+
+  run(fewer, PhotoCache::open(folder_.path() / "photos", 1), Prefetch::No,
+      ContactPhotoPreparation::Threads::One);
+  EXPECT_TRUE(entriesIn(folder_.path() / "photos").empty());
+}
+
+TEST_F(PhotoCacheTest, WithoutAServiceAPrefetchedRunLogsTheSameFailures) {
+  const PhotoRun plain = run(cards_, nullptr, Prefetch::No, ContactPhotoPreparation::Threads::One,
+                             /*serviceFails=*/true);
+  const PhotoRun prefetched =
+      run(cards_, cache(), Prefetch::Yes, ContactPhotoPreparation::Threads::AllCores,
+          /*serviceFails=*/true);
+  EXPECT_EQ(prefetched.photos, plain.photos);
+  EXPECT_EQ(prefetched.log, plain.log);
+  EXPECT_TRUE(entriesIn(folder_.path() / "photos").empty());
+}
+
+}  // namespace
+}  // namespace zt::contacts
