@@ -4,14 +4,12 @@
 
 #include <cstdint>
 #include <filesystem>
-#include <fstream>
 #include <optional>
 #include <sstream>
 #include <string>
 #include <string_view>
 #include <vector>
 
-#include "platform/log.h"
 #include "platform/virtual/virtual_players.h"
 #include "support/captured_log.h"
 #include "support/scoped_environment.h"

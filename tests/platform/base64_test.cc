@@ -13,14 +13,6 @@ std::string decodedText(std::string_view text, Form form) {
   return bytes ? std::string(bytes->begin(), bytes->end()) : "<none>";
 }
 
-TEST(Base64Decode, ReadsWhatEncodeWrites) {
-  for (const std::string text : {"", "M", "Ma", "Man", "any carnal pleasure."}) {
-    const std::vector<std::uint8_t> bytes(text.begin(), text.end());
-    EXPECT_EQ(decodedText(encode(bytes), Form::Canonical), text);
-    EXPECT_EQ(decodedText(encode(bytes), Form::Tolerant), text);
-  }
-}
-
 TEST(Base64Decode, TheFormsDifferInBlanksPaddingAndUnusedBits) {
   struct Case {
     std::string_view text;

@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "platform/atomic_file.h"
+#include "platform/calendar_date.h"
 #include "support/files.h"
 #include "support/temporary_folder.h"
 
@@ -42,87 +43,48 @@ class AtomicWriteTest : public ::testing::Test {
   FolderHandle handle = openFolder(folder.path());
 };
 
-TEST_F(AtomicWriteTest, CreatesAndReplacesWholeFilesWithoutLeavingTemporaries) {
-  ASSERT_EQ(handle.atomicWrite("Tessel.vcf", bytesOf("first version, rather long")), std::nullopt);
-  EXPECT_EQ(contentsOf(folder / "Tessel.vcf"), "first version, rather long");
-
-  ASSERT_EQ(handle.atomicWrite("Tessel.vcf", bytesOf("short")), std::nullopt);
-  EXPECT_EQ(contentsOf(folder / "Tessel.vcf"), "short");
-
+TEST_F(AtomicWriteTest, ReplacesWholeFilesOfAnySizeWithTheUsualPermissions) {
+  std::vector<std::uint8_t> big(9 * 1024 * 1024 + 17);
+  for (std::size_t i = 0; i < big.size(); ++i) big[i] = static_cast<std::uint8_t>(i * 31 + 7);
+  const mode_t previous = ::umask(022);
+  ASSERT_EQ(handle.atomicWrite("Tessel.vcf", big), std::nullopt);
+  ::umask(previous);
+  EXPECT_EQ(contentsOf(folder / "Tessel.vcf"), std::string(big.begin(), big.end()));
+  struct stat info {};
+  ASSERT_EQ(::stat((folder / "Tessel.vcf").c_str(), &info), 0);
+  EXPECT_EQ(info.st_mode & 0777, 0644u);
   // An empty buffer still gives a file, an empty one.
   ASSERT_EQ(handle.atomicWrite("Tessel.vcf", {}), std::nullopt);
-  EXPECT_TRUE(fs::is_regular_file(folder / "Tessel.vcf"));
-  EXPECT_EQ(fs::file_size(folder / "Tessel.vcf"), 0u);
-
+  EXPECT_EQ(contentsOf(folder / "Tessel.vcf"), "");
   EXPECT_EQ(namesIn(folder.path()), std::vector<std::string>{"Tessel.vcf"});
 }
 
-TEST_F(AtomicWriteTest, LargeBuffersArriveWhole) {
-  std::vector<std::uint8_t> bytes(9 * 1024 * 1024 + 17);
-  for (std::size_t i = 0; i < bytes.size(); ++i) bytes[i] = static_cast<std::uint8_t>(i * 31 + 7);
-  ASSERT_EQ(handle.atomicWrite("big.ics", bytes), std::nullopt);
-  const std::string written = contentsOf(folder / "big.ics");
-  ASSERT_EQ(written.size(), bytes.size());
-  EXPECT_TRUE(std::equal(bytes.begin(), bytes.end(), written.begin(),
-                         [](std::uint8_t b, char c) { return b == static_cast<std::uint8_t>(c); }));
-}
-
-TEST_F(AtomicWriteTest, WrittenFilesGetTheUsualPermissions) {
-  const mode_t previous = ::umask(022);
-  const auto error = handle.atomicWrite("Tessel-Home.ics", bytesOf("BEGIN:VCALENDAR"));
-  ::umask(previous);
-  ASSERT_EQ(error, std::nullopt);
-  struct stat info {};
-  ASSERT_EQ(::stat((folder / "Tessel-Home.ics").c_str(), &info), 0);
-  EXPECT_EQ(info.st_mode & 0777, 0644u);
-}
-
 TEST_F(AtomicWriteTest, NamesAtTheLengthLimitStillWork) {
-  const std::string name = "Tessel-" + std::string(240, 'x') + ".ics";  // 251 bytes
-  ASSERT_EQ(handle.atomicWrite(name, bytesOf("x")), std::nullopt);
-  EXPECT_EQ(namesIn(folder.path()), std::vector<std::string>{name});
   // Shortening the temporary name never cuts a UTF-8 character in half.
   std::string wide = "Tessel-";
   while (wide.size() < 248) wide += "\xC3\xA9";  // é
   ASSERT_EQ(handle.atomicWrite(wide, bytesOf("y")), std::nullopt);
-  EXPECT_EQ(contentsOf(folder / wide), "y");
+  EXPECT_EQ(namesIn(folder.path()), std::vector<std::string>{wide});
 }
 
 TEST_F(AtomicWriteTest, AFailedRenameKeepsTheTargetAndRemovesTheTemporaryFile) {
   // A folder in the target's place: the content is written, then the rename fails.
   fs::create_directory(folder / "Calendars");
   writeFile(folder / "Calendars" / "inside.ics", "kept");
-
   const auto error = handle.atomicWrite("Calendars", bytesOf("new content"));
   ASSERT_TRUE(error.has_value());
-  EXPECT_NE(error->find((folder / "Calendars").string()), std::string::npos) << *error;
+  EXPECT_CONTAINS(*error, (folder / "Calendars").string());
   EXPECT_EQ(contentsOf(folder / "Calendars" / "inside.ics"), "kept");
   EXPECT_EQ(namesIn(folder.path()), std::vector<std::string>{"Calendars"});
-}
-
-TEST_F(AtomicWriteTest, AReadOnlyFolderKeepsTheOldFile) {
-  if (::geteuid() == 0) GTEST_SKIP() << "root writes into read-only folders";
-  ASSERT_EQ(handle.atomicWrite("Tessel.vcf", bytesOf("old")), std::nullopt);
-  fs::permissions(folder.path(), fs::perms::owner_read | fs::perms::owner_exec);
-  const auto error = handle.atomicWrite("Tessel.vcf", bytesOf("new"));
-  fs::permissions(folder.path(), fs::perms::owner_all);
-  ASSERT_TRUE(error.has_value());
-  EXPECT_NE(error->find("Permission denied"), std::string::npos) << *error;
-  EXPECT_EQ(contentsOf(folder / "Tessel.vcf"), "old");
-  EXPECT_EQ(namesIn(folder.path()), std::vector<std::string>{"Tessel.vcf"});
 }
 
 TEST_F(AtomicWriteTest, AnAtomicFileThatIsNotCommittedChangesNothing) {
   writeFile(folder / "Tessel.vcf", "old");
   {
     auto created = AtomicFile::create(handle, "Tessel.vcf");
-    ASSERT_TRUE(std::holds_alternative<AtomicFile>(created));
     AtomicFile file = std::move(std::get<AtomicFile>(created));
     ASSERT_EQ(file.write(bytesOf("half of the new")), std::nullopt);
     EXPECT_EQ(file.temporaryPath().parent_path(), folder.path());
-    const std::string temporary = file.temporaryPath().filename().string();
-    EXPECT_TRUE(AtomicFile::isTemporaryName(temporary, "Tessel.vcf")) << temporary;
-    EXPECT_TRUE(fs::exists(file.temporaryPath()));
   }
   EXPECT_EQ(contentsOf(folder / "Tessel.vcf"), "old");
   EXPECT_EQ(namesIn(folder.path()), std::vector<std::string>{"Tessel.vcf"});
@@ -156,37 +118,18 @@ class FolderHandleTest : public ::testing::Test {
   FolderHandle handle = openFolder(folder.path());
 };
 
-TEST_F(FolderHandleTest, ModificationDateIsExactAndStable) {
-  ASSERT_EQ(handle.atomicWrite("Tessel.vcf", bytesOf("BEGIN:VCARD")), std::nullopt);
-  const auto dateOf = [&] {
-    auto attributes = handle.attributes("Tessel.vcf");
-    EXPECT_TRUE(std::holds_alternative<FileAttributes>(attributes));
-    return std::get<FileAttributes>(attributes).modificationDate;
-  };
-  const auto written = dateOf();
-  ASSERT_TRUE(written.has_value());
-  EXPECT_EQ(written->timeZone(), TimeZone::gmt());
-  EXPECT_EQ(dateOf(), written);
-
-  // Nanoseconds are kept: a stored date and a later read compare equal only if they are.
+// Nanoseconds are kept: a stored date and a later read compare equal only if they are.
+TEST_F(FolderHandleTest, ModificationDateIsExact) {
+  writeFile(folder / "Tessel.vcf", "BEGIN:VCARD");
   const timespec times[2] = {{1700000000, 123456789}, {1700000000, 987654321}};
   ASSERT_EQ(::utimensat(AT_FDCWD, (folder / "Tessel.vcf").c_str(), times, 0), 0);
   auto attributes = handle.attributes("Tessel.vcf");
-  ASSERT_TRUE(std::holds_alternative<FileAttributes>(attributes));
   const auto& read = std::get<FileAttributes>(attributes);
   EXPECT_EQ(read.type, FileType::Regular);
   EXPECT_EQ(read.size, 11u);
-  ASSERT_TRUE(read.modificationDate.has_value());
-  EXPECT_EQ(read.modificationDate->instant().time_since_epoch().count(), 1700000000);
-  EXPECT_EQ(read.modificationDate->nanoseconds(), 987654321u);
-  EXPECT_EQ(read.modificationDate->description(), "2023-11-14 22:13:20 +0000");
-  EXPECT_FALSE(read.modificationDate->isSameInstant(*written));
-
-  auto missing = handle.attributes("absent.vcf");
-  ASSERT_TRUE(std::holds_alternative<std::string>(missing));
-  EXPECT_EQ(std::get<std::string>(missing), "Cannot read the attributes of " +
-                                                (folder / "absent.vcf").string() +
-                                                ": No such file or directory");
+  EXPECT_EQ(read.modificationDate,
+            CalendarDate(std::chrono::sys_seconds(std::chrono::seconds(1700000000)),
+                         TimeZone::gmt(), 987654321));
 }
 
 TEST_F(FolderHandleTest, ChildFoldersAreOpenedOrCreatedButNeverThroughALink) {
@@ -201,10 +144,6 @@ TEST_F(FolderHandleTest, ChildFoldersAreOpenedOrCreatedButNeverThroughALink) {
   EXPECT_EQ(std::get<FolderHandle>(created).path(), folder / "Contacts");
   EXPECT_TRUE(fs::is_directory(folder / "Contacts"));
   EXPECT_TRUE(std::holds_alternative<FolderHandle>(handle.openChild("Contacts", IfMissing::Fail)));
-
-  auto attributes = handle.attributes("Link");
-  ASSERT_TRUE(std::holds_alternative<FileAttributes>(attributes));
-  EXPECT_EQ(std::get<FileAttributes>(attributes).type, FileType::Link);
 
   const struct {
     const char* name;
@@ -256,9 +195,6 @@ TEST_F(FolderHandleTest, RemovalTakesFoldersWholeAndLinksAsLinks) {
   EXPECT_EQ(namesIn(in), std::vector<std::string>{".hidden"});
   EXPECT_EQ(namesIn(outside), (std::vector<std::string>{"mine.ics", "sub"}));
   EXPECT_EQ(namesIn(outside / "sub"), std::vector<std::string>{"deeper.ics"});
-
-  EXPECT_EQ(calendars.remove("absent"),
-            "Cannot remove " + (in / "absent").string() + ": No such file or directory");
 }
 
 TEST_F(FolderHandleTest, AFolderSwappedForALinkAfterOpeningCannotRedirectTheHandle) {

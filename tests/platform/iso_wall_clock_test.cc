@@ -34,27 +34,16 @@ TEST(IsoWallClock, ReadsTheFieldsAndStopsWhereTheFormEnds) {
       {"2026-11-21T10:05:09Z", Four, Required, "2026-11-21 10:5:9+0 @19"},
       {"2026-11-21T10:05", Four, Required, "form"},
       {"2026-11-21T10:05", Extended, Optional, "2026-11-21 10:5:0+0 @16"},
-      {"2026-11-21T10:05:09.5", Four, Required, "2026-11-21 10:5:9+500000000 @21"},
       {"2026-11-21T10:05:09.123456789", Four, Required, "2026-11-21 10:5:9+123456789 @29"},
       {"2026-11-21T10:05:09.1234567891", Four, Required, "long fraction"},
       {"2026-11-21T10:05:09.", Four, Required, "form"},
       {"-0044-03-15T12:00", Extended, Optional, "-44-3-15 12:0:0+0 @17"},
       {"-0044-03-15T12:00:00", Four, Required, "form"},
       {"123456789-01-01T00:00", Extended, Optional, "123456789-1-1 0:0:0+0 @21"},
-      {"20260-11-21T10:05:09", Four, Required, "form"},
       {"2026-1-21T10:05:09", Four, Required, "form"},
       {"2026-13-32T25:61:61", Four, Required, "2026-13-32 25:61:61+0 @19"},  // checked later
   };
   for (const Case& c : cases) EXPECT_EQ(reading(c.text, c.year, c.seconds), c.read) << c.text;
-}
-
-TEST(IsoWallClock, TheFirstFieldOutOfRangeIsNamed) {
-  EXPECT_EQ(firstInvalidField({2024, 2, 29, 23, 59, 59, 0}), Field::None);
-  EXPECT_EQ(firstInvalidField({2024, 13, 40, 24, 0, 0, 0}), Field::Month);
-  EXPECT_EQ(firstInvalidField({2023, 2, 29, 24, 0, 0, 0}), Field::Day);
-  EXPECT_EQ(firstInvalidField({2023, 2, 28, 24, 60, 0, 0}), Field::Hour);
-  EXPECT_EQ(firstInvalidField({2023, 2, 28, 23, 60, 60, 0}), Field::Minute);
-  EXPECT_EQ(firstInvalidField({2023, 2, 28, 23, 59, 60, 0}), Field::Second);
 }
 
 }  // namespace

