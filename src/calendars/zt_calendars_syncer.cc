@@ -158,21 +158,21 @@ bool ZTCalendarsSyncer::getChanges() {
 
 bool ZTCalendarsSyncer::cleanCalendarFolder() {
   const platform::FolderHandle* folder = _syncManager.zetoCalendarsFolder();
-  std::variant<std::vector<std::string>, std::string> listing =
+  platform::Result<std::vector<std::string>> listing =
       folder ? folder->entries()
-             : std::variant<std::vector<std::string>, std::string>(
-                   "the player has no calendars folder");
-  if (const std::string* failure = std::get_if<std::string>(&listing)) {
-    Log::debug("Can't clean calendars folder. Reason: %@", *failure);
+             : platform::Result<std::vector<std::string>>(
+                   platform::Error{"the player has no calendars folder"});
+  if (!listing) {
+    Log::debug("Can't clean calendars folder. Reason: %@", listing.error());
     _syncManager.setLastStatus(sync::kStatusWriteFailed);
     return false;
   }
   // Every entry goes, the temporary files of an interrupted write included. A link is removed
   // as a link: what it leads to is not on the player.
-  for (const std::string& name : std::get<std::vector<std::string>>(listing)) {
+  for (const std::string& name : *listing) {
     Log::debug("Removing %@", name);
-    if (std::optional<std::string> failure = folder->remove(name)) {
-      Log::debug("The calendar '%@' could not be removed. Reason: %@", name, *failure);
+    if (platform::Result<void> removed = folder->remove(name); !removed) {
+      Log::debug("The calendar '%@' could not be removed. Reason: %@", name, removed.error());
     }
   }
   return true;

@@ -76,7 +76,7 @@ bool ZTCalendarsSyncer::uploadChangesForCalendarWithID(const std::string& /*cale
   std::filesystem::path path =
       folder ? std::filesystem::path(*folder) / fileName : std::filesystem::path(fileName);
   const platform::FolderHandle* calendars = _syncManager.zetoCalendarsFolder();
-  if (!calendars || calendars->atomicWrite(fileName, data)) {
+  if (!calendars || !calendars->atomicWrite(fileName, data)) {
     Log::debug("Can't write calendar at path %@", path.string());
     _syncManager.setLastStatus(sync::kStatusWriteFailed);
     return false;

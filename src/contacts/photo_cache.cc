@@ -1,10 +1,5 @@
 #include "contacts/photo_cache.h"
 
-#include <fcntl.h>
-#include <openssl/evp.h>
-#include <sys/stat.h>
-#include <unistd.h>
-
 #include <atomic>
 #include <cstdlib>
 #include <cstring>
@@ -12,6 +7,7 @@
 #include <vector>
 
 #include "contacts/contact_photo.h"
+#include "platform/sha256.h"
 
 namespace zt::contacts {
 
@@ -93,49 +89,6 @@ std::optional<PhotoConversion> decode(const PhotoKey& key, const platform::Data&
   return conversion;
 }
 
-// The regular file `name` in the folder, never through a link; none when it is anything else
-// or larger than any entry.
-std::optional<platform::Data> readEntry(int folder, const std::string& name) {
-  const int fd = openat(folder, name.c_str(), O_RDONLY | O_NOFOLLOW | O_CLOEXEC | O_NONBLOCK);
-  if (fd < 0) return std::nullopt;
-  std::optional<platform::Data> bytes;
-  struct stat status {};
-  if (fstat(fd, &status) == 0 && S_ISREG(status.st_mode) &&
-      static_cast<std::uint64_t>(status.st_size) <= kLargestEntry) {
-    platform::Data data(static_cast<std::size_t>(status.st_size));
-    std::size_t done = 0;
-    while (done < data.size()) {
-      const ssize_t got = read(fd, data.data() + done, data.size() - done);
-      if (got <= 0) break;
-      done += static_cast<std::size_t>(got);
-    }
-    if (done == data.size()) bytes = std::move(data);
-  }
-  close(fd);
-  return bytes;
-}
-
-// Writes `name` through a temporary file renamed over it. A cache needs no fsync: an entry
-// cut short by a crash fails its length check and is written again.
-void writeEntry(int folder, const std::string& name, const platform::Data& bytes) {
-  static std::atomic<unsigned> counter{0};
-  const std::string temporary =
-      "." + name + ".tmp" + std::to_string(getpid()) + "." + std::to_string(counter.fetch_add(1));
-  const int fd =
-      openat(folder, temporary.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0600);
-  if (fd < 0) return;
-  std::size_t done = 0;
-  while (done < bytes.size()) {
-    const ssize_t wrote = write(fd, bytes.data() + done, bytes.size() - done);
-    if (wrote <= 0) break;
-    done += static_cast<std::size_t>(wrote);
-  }
-  const bool complete = close(fd) == 0 && done == bytes.size();
-  if (!complete || renameat(folder, temporary.c_str(), folder, name.c_str()) != 0) {
-    unlinkat(folder, temporary.c_str(), 0);
-  }
-}
-
 }  // namespace
 
 bool isLasting(const PhotoConversion& conversion) {
@@ -155,32 +108,31 @@ std::unique_ptr<PhotoCache> PhotoCache::openUserCache() {
   } else {
     return nullptr;
   }
-  auto opened = platform::FolderHandle::open(base);
-  if (std::holds_alternative<std::string>(opened)) {
+  platform::Result<platform::FolderHandle> opened = platform::FolderHandle::open(base);
+  if (!opened) {
     std::error_code ignored;
     if (!std::filesystem::create_directories(base, ignored)) return nullptr;
     opened = platform::FolderHandle::open(base);
   }
-  auto* handle = std::get_if<platform::FolderHandle>(&opened);
-  if (!handle) return nullptr;
-  auto tool = handle->openChild("zetosynctool", platform::IfMissing::Create);
-  auto* toolFolder = std::get_if<platform::FolderHandle>(&tool);
-  if (!toolFolder) return nullptr;
-  auto photos = toolFolder->openChild("photos", platform::IfMissing::Create);
-  auto* photosFolder = std::get_if<platform::FolderHandle>(&photos);
-  if (!photosFolder) return nullptr;
-  return std::unique_ptr<PhotoCache>(new PhotoCache(std::move(*photosFolder), kDefaultSizeCap));
+  if (!opened) return nullptr;
+  platform::Result<platform::FolderHandle> tool =
+      opened->openChild("zetosynctool", platform::IfMissing::Create);
+  if (!tool) return nullptr;
+  platform::Result<platform::FolderHandle> photos =
+      tool->openChild("photos", platform::IfMissing::Create);
+  if (!photos) return nullptr;
+  return std::unique_ptr<PhotoCache>(new PhotoCache(std::move(photos).value(), kDefaultSizeCap));
 }
 
 std::unique_ptr<PhotoCache> PhotoCache::open(const std::filesystem::path& folder,
                                              std::uint64_t sizeCap) {
-  auto parent = platform::FolderHandle::open(folder.parent_path());
-  auto* handle = std::get_if<platform::FolderHandle>(&parent);
-  if (!handle) return nullptr;
-  auto opened = handle->openChild(folder.filename().string(), platform::IfMissing::Create);
-  auto* photos = std::get_if<platform::FolderHandle>(&opened);
+  platform::Result<platform::FolderHandle> parent =
+      platform::FolderHandle::open(folder.parent_path());
+  if (!parent) return nullptr;
+  platform::Result<platform::FolderHandle> photos =
+      parent->openChild(folder.filename().string(), platform::IfMissing::Create);
   if (!photos) return nullptr;
-  return std::unique_ptr<PhotoCache>(new PhotoCache(std::move(*photos), sizeCap));
+  return std::unique_ptr<PhotoCache>(new PhotoCache(std::move(photos).value(), sizeCap));
 }
 
 PhotoCache::PhotoCache(platform::FolderHandle folder, std::uint64_t sizeCap)
@@ -193,16 +145,10 @@ PhotoKey PhotoCache::keyFor(std::span<const std::uint8_t> picture) {
                         std::to_string(ContactPhotoPreparation::kSide) + "\n" +
                         std::to_string(ContactPhotoPreparation::kLargestEmbeddedJPEG) + "\n" +
                         std::string(platform::imageServiceIdentity()) + "\n";
-  PhotoKey key{};
-  unsigned int length = 0;
-  EVP_MD_CTX* digest = EVP_MD_CTX_new();
-  if (digest && EVP_DigestInit_ex(digest, EVP_sha256(), nullptr) == 1 &&
-      EVP_DigestUpdate(digest, context.data(), context.size()) == 1 &&
-      EVP_DigestUpdate(digest, picture.data(), picture.size()) == 1) {
-    EVP_DigestFinal_ex(digest, key.data(), &length);
-  }
-  EVP_MD_CTX_free(digest);
-  return key;
+  platform::Sha256 digest;
+  digest.update(context);
+  digest.update(picture);
+  return digest.finish();
 }
 
 void PhotoCache::touch(const std::string& name) {
@@ -212,7 +158,8 @@ void PhotoCache::touch(const std::string& name) {
 
 std::optional<PhotoConversion> PhotoCache::find(const PhotoKey& key) {
   const std::string name = nameOf(key);
-  std::optional<platform::Data> entry = readEntry(folder_.descriptor(), name);
+  // A cache entry is small; anything else in its place is no entry.
+  std::optional<platform::Data> entry = folder_.readFile(name, kLargestEntry).valueOrNone();
   if (!entry) return std::nullopt;
   std::optional<PhotoConversion> conversion = decode(key, *entry);
   if (conversion) touch(name);
@@ -222,31 +169,33 @@ std::optional<PhotoConversion> PhotoCache::find(const PhotoKey& key) {
 void PhotoCache::store(const PhotoKey& key, const PhotoConversion& conversion) {
   if (!isLasting(conversion)) return;
   const std::string name = nameOf(key);
-  writeEntry(folder_.descriptor(), name, encode(key, conversion));
+  // No fsync: an entry cut short by a crash fails its length check and is written again.
+  (void)folder_.atomicWrite(name, encode(key, conversion), platform::Durability::Unsynced);
   touch(name);
 }
 
 void PhotoCache::prune() {
   std::lock_guard lock(mutex_);
-  auto listed = folder_.entries();
-  if (auto* names = std::get_if<std::vector<std::string>>(&listed)) {
+  platform::Result<std::vector<std::string>> listed = folder_.entries();
+  if (listed) {
     std::uint64_t total = 0;
-    for (const std::string& name : *names) {
+    for (const std::string& name : *listed) {
       // Left-over temporaries are removed too: no other run writes this folder meanwhile,
-      // or it only costs that run one conversion.
+      // or it only costs that run one conversion. Removal is best effort: what stays is
+      // tried again at the next run.
       if (!isEntryName(name)) {
-        if (name.starts_with('.') && name.find(".tmp") != std::string::npos) folder_.remove(name);
+        if (name.starts_with('.') && name.find(".tmp") != std::string::npos)
+          (void)folder_.remove(name);
         continue;
       }
       if (!used_.contains(name)) {
-        folder_.remove(name);
+        (void)folder_.remove(name);
         continue;
       }
-      auto attributes = folder_.attributes(name);
-      auto* file = std::get_if<platform::FileAttributes>(&attributes);
+      platform::Result<platform::FileAttributes> file = folder_.attributes(name);
       if (!file) continue;
       if (total + file->size > sizeCap_) {
-        folder_.remove(name);
+        (void)folder_.remove(name);
         continue;
       }
       total += file->size;

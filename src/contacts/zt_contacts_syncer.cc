@@ -116,9 +116,9 @@ bool ZTContactsSyncer::fileOnZetoNeedsPush() {
   }
   std::optional<platform::CalendarDate> date;
   if (const platform::FolderHandle* contacts = _syncManager.zetoContactsFolder()) {
-    auto attributes = contacts->attributes(std::string(kFileName));
-    if (auto* read = std::get_if<platform::FileAttributes>(&attributes))
-      date = std::move(read->modificationDate);
+    platform::Result<platform::FileAttributes> attributes =
+        contacts->attributes(std::string(kFileName));
+    if (attributes) date = std::move(attributes->modificationDate);
   }
   if (!date) {
     Log::debug("Can't get VCF attributes on Zeto, force pushing VCF");

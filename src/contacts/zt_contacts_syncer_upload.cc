@@ -32,23 +32,22 @@ bool ZTContactsSyncer::uploadChanges() {
   // A power loss or a pulled cable leaves the player with the old file or the new one,
   // never half of one. The accepted changes stay uncommitted when the write fails, so the
   // next run offers them again. Without a folder on the player there is nowhere to write.
-  if (!contacts || contacts->atomicWrite(fileName, bytes)) {
+  if (!contacts || !contacts->atomicWrite(fileName, bytes)) {
     Log::debug("Unabled to write file on Zeto");
     _syncManager.setLastStatus(sync::kStatusWriteFailed);
     return false;
   }
   Log::debug("Uploading done");
 
-  std::variant<platform::FileAttributes, std::string> attributes = contacts->attributes(fileName);
-  if (const std::string* reason = std::get_if<std::string>(&attributes)) {
-    Log::debug("Can't get VCF attributes after push. Reason: %@", *reason);
+  platform::Result<platform::FileAttributes> attributes = contacts->attributes(fileName);
+  if (!attributes) {
+    Log::debug("Can't get VCF attributes after push. Reason: %@", attributes.error());
     _syncManager.setLastStatus(sync::kStatusWriteFailed);
     return false;
   }
   // The date is the one the next run compares with the file's (the same full-precision
   // reading), so an untouched file is recognised.
-  const std::optional<platform::CalendarDate>& date =
-      std::get<platform::FileAttributes>(attributes).modificationDate;
+  const std::optional<platform::CalendarDate>& date = attributes->modificationDate;
   try {
     tessel::Client& client = *_syncManager.syncClient();
     if (date) {

@@ -56,8 +56,7 @@ bool AtomicFile::isTemporaryName(std::string_view entry, const std::string& name
          entry.substr(prefix.size()).find_first_not_of(kUniqueCharacters) == std::string::npos;
 }
 
-std::variant<AtomicFile, std::string> AtomicFile::create(const FolderHandle& folder,
-                                                         const std::string& name) {
+Result<AtomicFile> AtomicFile::create(const FolderHandle& folder, const std::string& name) {
   const std::filesystem::path target = folder.path() / name;
   const int folderFd = ::fcntl(folder.descriptor(), F_DUPFD_CLOEXEC, 0);
   if (folderFd < 0) return errorText("create a temporary file for", target, errno);
@@ -116,7 +115,7 @@ void AtomicFile::discard() {
   temporary_.clear();
 }
 
-std::optional<std::string> AtomicFile::write(std::span<const std::uint8_t> bytes) {
+Result<void> AtomicFile::write(std::span<const std::uint8_t> bytes) {
   if (fd_ < 0) return errorText("write", target(), EBADF);
   while (!bytes.empty()) {
     const ssize_t written = ::write(fd_, bytes.data(), bytes.size());
@@ -128,14 +127,14 @@ std::optional<std::string> AtomicFile::write(std::span<const std::uint8_t> bytes
     }
     bytes = bytes.subspan(static_cast<std::size_t>(written));
   }
-  return std::nullopt;
+  return {};
 }
 
-std::optional<std::string> AtomicFile::commit() {
+Result<void> AtomicFile::commit(Durability durability) {
   if (fd_ < 0) return errorText("write", target(), EBADF);
   // Durable content first: otherwise a crash after the rename could leave an empty file
   // under the target's name.
-  if (::fsync(fd_) != 0) {
+  if (durability == Durability::Synced && ::fsync(fd_) != 0) {
     const int error = errno;
     discard();
     return errorText("write", target(), error);
@@ -154,11 +153,12 @@ std::optional<std::string> AtomicFile::commit() {
   }
   temporary_.clear();
 
+  if (durability == Durability::Unsynced) return {};
   int error = ::fsync(folderFd_) == 0 ? 0 : errno;
   // Some file systems cannot fsync a folder at all; the rename is then as durable as they get.
   if (error == EINVAL || error == ENOTSUP) error = 0;
   if (error != 0) return errorText("flush the folder of", target(), error);
-  return std::nullopt;
+  return {};
 }
 
 }  // namespace zt::platform

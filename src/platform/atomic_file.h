@@ -9,6 +9,7 @@
 #include <variant>
 
 #include "platform/folder_handle.h"
+#include "platform/result.h"
 
 namespace zt::platform {
 
@@ -24,8 +25,7 @@ class AtomicFile {
  public:
   // Creates the temporary file for `name` in `folder`, or answers why it cannot be created.
   // The file keeps its own descriptor of the folder: the handle may go first.
-  static std::variant<AtomicFile, std::string> create(const FolderHandle& folder,
-                                                      const std::string& name);
+  static Result<AtomicFile> create(const FolderHandle& folder, const std::string& name);
 
   // Whether `entry` is a name create() may give a temporary file for `name`.
   static bool isTemporaryName(std::string_view entry, const std::string& name);
@@ -37,10 +37,10 @@ class AtomicFile {
   ~AtomicFile();
 
   // Appends all of `bytes` (short and interrupted writes are continued).
-  std::optional<std::string> write(std::span<const std::uint8_t> bytes);
+  Result<void> write(std::span<const std::uint8_t> bytes);
   // Puts the written content in place. After a failure the temporary file is gone and the
   // target holds its old content, unless only the final fsync of the folder failed.
-  std::optional<std::string> commit();
+  Result<void> commit(Durability durability = Durability::Synced);
 
   std::filesystem::path target() const { return folderPath_ / name_; }
   std::filesystem::path temporaryPath() const { return folderPath_ / temporary_; }

@@ -31,7 +31,7 @@ class FileSystem {
 
   // The folder at `path` (a volume's mount point), or the description of why it cannot be
   // opened.
-  std::variant<FolderHandle, std::string> openFolder(const std::filesystem::path& path) const {
+  Result<FolderHandle> openFolder(const std::filesystem::path& path) const {
     return FolderHandle::open(path);
   }
 };

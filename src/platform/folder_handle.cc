@@ -80,10 +80,9 @@ std::variant<std::vector<std::string>, int> listNames(int folder) {
 
 // Removes `name` from the folder `folder` (known as `path`): anything but a real folder is
 // unlinked, a real folder is opened without following links and emptied the same way first.
-std::optional<std::string> removeEntry(int folder, const std::filesystem::path& path,
-                                       const std::string& name) {
+Result<void> removeEntry(int folder, const std::filesystem::path& path, const std::string& name) {
   const std::filesystem::path entryPath = path / name;
-  if (::unlinkat(folder, name.c_str(), 0) == 0) return std::nullopt;
+  if (::unlinkat(folder, name.c_str(), 0) == 0) return {};
   // unlink(2) refuses folders with EISDIR (EPERM on some file systems, where EPERM can also
   // be a refusal of the file itself).
   const int unlinkError = errno;
@@ -93,25 +92,25 @@ std::optional<std::string> removeEntry(int folder, const std::filesystem::path& 
   if (child < 0)
     return errorText("remove", entryPath, errno == ENOTDIR || errno == ELOOP ? unlinkError : errno);
   auto listing = listNames(child);
-  std::optional<std::string> failure;
+  Result<void> emptied;
   if (const int* error = std::get_if<int>(&listing)) {
-    failure = errorText("remove", entryPath, *error);
+    emptied = errorText("remove", entryPath, *error);
   } else {
     for (const std::string& inner : std::get<std::vector<std::string>>(listing)) {
-      failure = removeEntry(child, entryPath, inner);
-      if (failure) break;
+      emptied = removeEntry(child, entryPath, inner);
+      if (!emptied) break;
     }
   }
   ::close(child);
-  if (failure) return failure;
+  if (!emptied) return emptied;
   if (::unlinkat(folder, name.c_str(), AT_REMOVEDIR) != 0)
     return errorText("remove", entryPath, errno);
-  return std::nullopt;
+  return {};
 }
 
 }  // namespace
 
-std::variant<FolderHandle, std::string> FolderHandle::open(const std::filesystem::path& path) {
+Result<FolderHandle> FolderHandle::open(const std::filesystem::path& path) {
   const int fd = ::open(path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
   if (fd < 0) return errorText("open the folder", path, errno);
   return FolderHandle(path, fd);
@@ -135,8 +134,7 @@ FolderHandle::~FolderHandle() {
   if (fd_ >= 0) ::close(fd_);
 }
 
-std::variant<FolderHandle, std::string> FolderHandle::openChild(const std::string& name,
-                                                                IfMissing ifMissing) const {
+Result<FolderHandle> FolderHandle::openChild(const std::string& name, IfMissing ifMissing) const {
   const std::filesystem::path childPath = path_ / name;
   int fd = ::openat(fd_, name.c_str(), kFolderFlags);
   if (fd < 0 && errno == ENOENT && ifMissing == IfMissing::Create) {
@@ -149,37 +147,69 @@ std::variant<FolderHandle, std::string> FolderHandle::openChild(const std::strin
   return FolderHandle(childPath, fd);
 }
 
-std::variant<std::vector<std::string>, std::string> FolderHandle::entries() const {
+Result<std::vector<std::string>> FolderHandle::entries() const {
   auto listing = listNames(fd_);
   if (const int* error = std::get_if<int>(&listing))
     return errorText("list the folder", path_, *error);
   return std::get<std::vector<std::string>>(std::move(listing));
 }
 
-std::variant<FileAttributes, std::string> FolderHandle::attributes(const std::string& name) const {
+Result<FileAttributes> FolderHandle::attributes(const std::string& name) const {
   auto result = readAttributes(fd_, name);
   if (const int* error = std::get_if<int>(&result))
     return errorText("read the attributes of", path_ / name, *error);
   return std::get<FileAttributes>(std::move(result));
 }
 
-std::optional<std::string> FolderHandle::remove(const std::string& name) const {
+Result<void> FolderHandle::remove(const std::string& name) const {
   return removeEntry(fd_, path_, name);
 }
 
-std::optional<std::string> FolderHandle::atomicWrite(const std::string& name,
-                                                     std::span<const std::uint8_t> bytes) const {
-  auto created = AtomicFile::create(*this, name);
-  if (auto* error = std::get_if<std::string>(&created)) return std::move(*error);
-  AtomicFile& file = std::get<AtomicFile>(created);
-  if (auto error = file.write(bytes)) return error;
-  return file.commit();
+Result<void> FolderHandle::atomicWrite(const std::string& name, std::span<const std::uint8_t> bytes,
+                                       Durability durability) const {
+  Result<AtomicFile> file = AtomicFile::create(*this, name);
+  if (!file) return Error{file.error()};
+  if (Result<void> written = file->write(bytes); !written) return written;
+  return file->commit(durability);
 }
 
-std::optional<std::string> FolderHandle::removeStaleTemporaries(const std::string& name) const {
-  auto listing = entries();
-  if (auto* error = std::get_if<std::string>(&listing)) return std::move(*error);
-  for (const std::string& entry : std::get<std::vector<std::string>>(listing)) {
+Result<std::vector<std::uint8_t>> FolderHandle::readFile(const std::string& name,
+                                                         std::size_t largest) const {
+  const std::filesystem::path filePath = path_ / name;
+  // O_NONBLOCK: a named pipe put in the file's place must not hang the open.
+  const int fd = ::openat(fd_, name.c_str(), O_RDONLY | O_NOFOLLOW | O_CLOEXEC | O_NONBLOCK);
+  if (fd < 0) return errorText("read", filePath, errno);
+  struct stat status {};
+  Result<std::vector<std::uint8_t>> result = errorText("read", filePath, EINVAL);
+  if (::fstat(fd, &status) != 0) {
+    result = errorText("read", filePath, errno);
+  } else if (!S_ISREG(status.st_mode)) {
+    result = errorText("read", filePath, EINVAL);
+  } else if (static_cast<std::uint64_t>(status.st_size) > largest) {
+    result = errorText("read", filePath, EFBIG);
+  } else {
+    std::vector<std::uint8_t> bytes(static_cast<std::size_t>(status.st_size));
+    std::size_t done = 0;
+    while (done < bytes.size()) {
+      const ssize_t got = ::read(fd, bytes.data() + done, bytes.size() - done);
+      if (got < 0 && errno == EINTR) continue;
+      if (got <= 0) break;
+      done += static_cast<std::size_t>(got);
+    }
+    if (done == bytes.size()) {
+      result = std::move(bytes);
+    } else {
+      result = errorText("read", filePath, EIO);
+    }
+  }
+  ::close(fd);
+  return result;
+}
+
+Result<void> FolderHandle::removeStaleTemporaries(const std::string& name) const {
+  Result<std::vector<std::string>> listing = entries();
+  if (!listing) return Error{listing.error()};
+  for (const std::string& entry : *listing) {
     if (!AtomicFile::isTemporaryName(entry, name)) continue;
     auto attributes = readAttributes(fd_, entry);
     const auto* read = std::get_if<FileAttributes>(&attributes);
@@ -187,7 +217,7 @@ std::optional<std::string> FolderHandle::removeStaleTemporaries(const std::strin
     if (::unlinkat(fd_, entry.c_str(), 0) != 0 && errno != ENOENT)
       return errorText("remove", path_ / entry, errno);
   }
-  return std::nullopt;
+  return {};
 }
 
 }  // namespace zt::platform

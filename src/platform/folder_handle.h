@@ -9,6 +9,7 @@
 #include <vector>
 
 #include "platform/calendar_date.h"
+#include "platform/result.h"
 
 namespace zt::platform {
 
@@ -25,6 +26,10 @@ struct FileAttributes {
 
 enum class IfMissing { Create, Fail };
 
+// Whether a replaced file must survive a power loss (fsync of the file and its folder), or
+// may be lost to one, as an entry of a cache may.
+enum class Durability { Synced, Unsynced };
+
 // One open folder, and every operation on the names in it made relative to its descriptor
 // (openat(2), mkdirat(2), renameat(2), unlinkat(2), statx(2) with AT_SYMLINK_NOFOLLOW).
 // Once open, the folder cannot be redirected: renaming it or putting a symbolic link in its
@@ -35,7 +40,7 @@ class FolderHandle {
  public:
   // Opens the folder at `path`, following links on the way: this is the place the system
   // chose (a volume's mount point), not a name found on the volume.
-  static std::variant<FolderHandle, std::string> open(const std::filesystem::path& path);
+  static Result<FolderHandle> open(const std::filesystem::path& path);
 
   FolderHandle(FolderHandle&& other) noexcept;
   FolderHandle& operator=(FolderHandle&& other) noexcept;
@@ -45,25 +50,27 @@ class FolderHandle {
 
   // The folder `name` in this one, never through a symbolic link (O_DIRECTORY|O_NOFOLLOW).
   // With IfMissing::Create a missing folder is created first.
-  std::variant<FolderHandle, std::string> openChild(const std::string& name,
-                                                    IfMissing ifMissing) const;
+  Result<FolderHandle> openChild(const std::string& name, IfMissing ifMissing) const;
 
   // The names of the entries (dot files included, "." and ".." not), sorted by byte value.
-  std::variant<std::vector<std::string>, std::string> entries() const;
+  Result<std::vector<std::string>> entries() const;
   // Type, size and modification date of the entry itself, a link not followed.
-  std::variant<FileAttributes, std::string> attributes(const std::string& name) const;
+  Result<FileAttributes> attributes(const std::string& name) const;
   // Removes the entry: a link as a link, a folder with everything in it, descending only into
   // real folders.
-  std::optional<std::string> remove(const std::string& name) const;
+  Result<void> remove(const std::string& name) const;
 
   // Replaces the file `name` with `bytes` so that readers, and the device after a power
   // loss, see either the old content or the whole new one (see AtomicFile). On failure the
   // old file is untouched and no temporary file is left.
-  std::optional<std::string> atomicWrite(const std::string& name,
-                                         std::span<const std::uint8_t> bytes) const;
+  Result<void> atomicWrite(const std::string& name, std::span<const std::uint8_t> bytes,
+                           Durability durability = Durability::Synced) const;
+  // The content of the regular file `name`, never through a link; an error for anything else
+  // and for a file larger than `largest` bytes.
+  Result<std::vector<std::uint8_t>> readFile(const std::string& name, std::size_t largest) const;
   // Removes the regular files that an interrupted atomicWrite of `name` left behind. Only the
   // caller can know that no other writer of `name` is at work.
-  std::optional<std::string> removeStaleTemporaries(const std::string& name) const;
+  Result<void> removeStaleTemporaries(const std::string& name) const;
 
   // The path the folder was opened by, for messages and logs.
   const std::filesystem::path& path() const { return path_; }

@@ -122,16 +122,15 @@ std::optional<std::string> ZTSyncManager::checkForZetoFolder(const std::string& 
 ZTSyncManager::ZetoFolder ZTSyncManager::openZetoFolder(const std::string& name,
                                                         bool createIfNeeded) {
   Log::debug("Checking %@ folder on Zeto", name);
-  auto root = services_.files.openFolder(_pathToZetoVolume);
-  if (const std::string* reason = std::get_if<std::string>(&root)) {
-    Log::debug("Can't create folder. Reason: %@", *reason);
+  platform::Result<platform::FolderHandle> root = services_.files.openFolder(_pathToZetoVolume);
+  if (!root) {
+    Log::debug("Can't create folder. Reason: %@", root.error());
     return {};
   }
-  const platform::FolderHandle& volume = std::get<platform::FolderHandle>(root);
+  const platform::FolderHandle& volume = *root;
   // A link is not the player's folder even when it leads to one: following it would let the
   // sync empty and fill a folder anywhere on the computer.
-  auto attributes = volume.attributes(name);
-  const auto* existing = std::get_if<platform::FileAttributes>(&attributes);
+  platform::Result<platform::FileAttributes> existing = volume.attributes(name);
   if (existing && existing->type != platform::FileType::Directory) {
     Log::debug("Folder %@ on Zeto is a regular file, we can't use it to sync", name);
     return {};
@@ -142,13 +141,13 @@ ZTSyncManager::ZetoFolder ZTSyncManager::openZetoFolder(const std::string& name,
   }
   // Opened without following links, so a link put in the folder's place after the check
   // fails here instead of leading elsewhere.
-  auto folder =
+  platform::Result<platform::FolderHandle> folder =
       volume.openChild(name, existing ? platform::IfMissing::Fail : platform::IfMissing::Create);
-  if (const std::string* reason = std::get_if<std::string>(&folder)) {
-    Log::debug("Can't create folder. Reason: %@", *reason);
+  if (!folder) {
+    Log::debug("Can't create folder. Reason: %@", folder.error());
     return {};
   }
-  return {.opened = std::get<platform::FolderHandle>(std::move(folder))};
+  return {.opened = std::move(folder).value()};
 }
 
 bool ZTSyncManager::checkZetoPIMPaths() {

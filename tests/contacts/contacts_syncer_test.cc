@@ -49,11 +49,10 @@ TEST_F(PushDecision, TheFirstRunPushesAndRemembersTheFileItWrote) {
   EXPECT_TRUE(first.logged("List of contacts to push has changed"));
   EXPECT_EQ(first.uploadingProgress, (std::vector<double>{0, 34, 68, 100, 100}));
   auto folder = platform::FolderHandle::open(contactsFolder());
-  ASSERT_TRUE(std::holds_alternative<platform::FolderHandle>(folder));
-  auto attributes = std::get<platform::FolderHandle>(folder).attributes("Tessel.vcf");
-  ASSERT_TRUE(std::holds_alternative<platform::FileAttributes>(attributes));
-  const std::optional<platform::CalendarDate>& date =
-      std::get<platform::FileAttributes>(attributes).modificationDate;
+  ASSERT_TRUE(folder.ok());
+  auto attributes = folder->attributes("Tessel.vcf");
+  ASSERT_TRUE(attributes.ok());
+  const std::optional<platform::CalendarDate>& date = attributes->modificationDate;
   ASSERT_TRUE(date);
   EXPECT_EQ(client()->setting("LastModDateForVCF"), platform::Value(*date));
   EXPECT_EQ(client()->setting("DidSyncContactImages"), platform::Value::boolean(false));
