@@ -99,37 +99,27 @@ TEST_F(CalendarsSync, WritesOneFilePerCalendarInTheUsersOrderAndEmptiesTheFolder
   EXPECT_GT(client(kClientID)->mirrorSize(), 0u);
 }
 
-TEST_F(CalendarsSync, TwoCalendarsWithOneTitleLeaveTheLaterOneInOneFile) {
-  putRecords({calendar("cal-a", "Family", {"ev-a"}), calendar("cal-b", "Family", {"ev-b"}),
-              event("ev-a", "Earlier", "2007-03-15T12:30:00"),
-              event("ev-b", "Later", "2007-03-16T09:00:00")});
-  tessel({"calendars", "order", "cal-a", "cal-b"});
-
-  const SynctoolRun run = syncClient(kClientID);
-
-  EXPECT_EQ(run.finalStatus(), 0) << run.log;
-  ASSERT_EQ(calendarFiles(), std::vector<std::string>{"Tessel-Family.ics"});
-  const std::string text = calendarFile("Tessel-Family.ics");
-  EXPECT_TRUE(contains(text, "X-WR-CALORDER:2l\r\n")) << text;
-  EXPECT_TRUE(contains(text, "SUMMARY:Later\r\n")) << text;
-  EXPECT_FALSE(contains(text, "Earlier")) << text;
-}
-
-TEST_F(CalendarsSync, ACalendarWithoutTitleIsSkippedWithoutFailingTheRun) {
+// A calendar without title is skipped without advancing the progress, but counted in the order;
+// of two calendars with one title the later one is left in the file.
+TEST_F(CalendarsSync, UntitledCalendarsAreSkippedAndOneTitleMakesOneFile) {
   putRecords({record("cal-untitled", Json{{"tessel.record.entity", "tessel.calendars.Calendar"},
                                           {"events", Json::array()}}),
-              calendar("cal-home", "Home", {})});
-  tessel({"calendars", "order", "cal-untitled", "cal-home"});
+              calendar("cal-a", "Family", {"ev-a"}), calendar("cal-b", "Family", {"ev-b"}),
+              event("ev-a", "Earlier", "2007-03-15T12:30:00"),
+              event("ev-b", "Later", "2007-03-16T09:00:00")});
+  tessel({"calendars", "order", "cal-untitled", "cal-a", "cal-b"});
 
   const SynctoolRun run = syncClient(kClientID);
 
   EXPECT_EQ(run.finalStatus(), 0) << run.log;
   EXPECT_TRUE(run.logged("Calendar has no name - ignoring this calendar")) << run.log;
-  // The skipped calendar does not advance the progress.
-  EXPECT_EQ(uploadingProgress(run), (std::vector<double>{0, 34, 50.5, 67, 100, 100}));
-  EXPECT_EQ(calendarFiles(), std::vector<std::string>{"Tessel-Home.ics"});
-  // The order follows the position in the list, skipped calendars counted.
-  EXPECT_TRUE(contains(calendarFile("Tessel-Home.ics"), "X-WR-CALORDER:2l\r\n"));
+  // Three calendars, two steps each; the skipped one does not advance the progress.
+  EXPECT_EQ(uploadingProgress(run), (std::vector<double>{0, 34, 45, 56, 67, 78, 100, 100}));
+  ASSERT_EQ(calendarFiles(), std::vector<std::string>{"Tessel-Family.ics"});
+  const std::string text = calendarFile("Tessel-Family.ics");
+  EXPECT_TRUE(contains(text, "X-WR-CALORDER:3l\r\n")) << text;
+  EXPECT_TRUE(contains(text, "SUMMARY:Later\r\n")) << text;
+  EXPECT_FALSE(contains(text, "Earlier")) << text;
 }
 
 TEST_F(CalendarsSync, ACalendarMissingFromTruthEndsTheCalendarsSyncWithAnError) {
@@ -186,44 +176,6 @@ TEST_F(CalendarsSync, TheFilterSelectsCalendarsAndTheUsersOrderIsKept) {
   EXPECT_TRUE(contains(calendarFile("Tessel-Charlie.ics"), "X-WR-CALORDER:1l\r\n"));
   EXPECT_TRUE(contains(calendarFile("Tessel-Alpha.ics"), "X-WR-CALORDER:2l\r\n"));
   EXPECT_TRUE(run.logContains("Filtered calendar IDs are:\n(cal-c, cal-a)")) << run.log;
-}
-
-TEST_F(CalendarsSync, DetachedOccurrencesBecomeExceptionDatesAndEventsOfTheirOwn) {
-  Json master = event("ev-master", "Standup", "2007-03-05T09:00:00");
-  master["record"]["exception dates"] = Json::array({date("2007-03-06T09:00:00")});
-  master["record"]["recurrences"] = Json::array({"rule"});
-  // The second one belongs to another calendar and adds nothing.
-  master["record"]["detached events"] = Json::array({"ev-moved-2", "ev-elsewhere", "ev-moved-1"});
-  Json moved1 = event("ev-moved-1", "Standup (moved)", "2007-03-07T10:00:00");
-  moved1["record"]["original date"] = date("2007-03-07T09:00:00");
-  Json moved2 = event("ev-moved-2", "Standup (late)", "2007-03-08T11:00:00");
-  moved2["record"]["original date"] = date("2007-03-08T09:00:00");
-  Json elsewhere = event("ev-elsewhere", "Elsewhere", "2007-03-09T11:00:00");
-  elsewhere["record"]["original date"] = date("2007-03-09T09:00:00");
-  putRecords({calendar("cal-team", "Team", {"ev-master", "ev-moved-1", "ev-moved-2"}),
-              calendar("cal-other", "Other", {"ev-elsewhere"}), master, moved1, moved2, elsewhere,
-              record("rule", Json{{"tessel.record.entity", "tessel.calendars.Recurrence"},
-                                  {"frequency", "daily"},
-                                  {"count", 10}})});
-  tessel({"calendars", "order", "cal-team"});
-
-  const SynctoolRun run = syncClient(kClientID);
-
-  EXPECT_EQ(run.finalStatus(), 0) << run.log;
-  const std::string text = calendarFile("Tessel-Team.ics");
-  // Stored exception dates first, then the moved occurrences in the relationship's order.
-  EXPECT_TRUE(contains(text,
-                       "DTSTART:20070305T090000Z\r\n"
-                       "EXDATE:20070306T090000Z\r\n"
-                       "EXDATE:20070308T090000Z\r\n"
-                       "EXDATE:20070307T090000Z\r\n"
-                       "RRULE:FREQ=DAILY;COUNT=10\r\n"))
-      << text;
-  EXPECT_FALSE(contains(text, "20070309T090000Z")) << text;
-  EXPECT_TRUE(contains(text,
-                       "SUMMARY:Standup (moved)\r\nDTSTART:20070307T100000Z\r\n"
-                       "RECURRENCE-ID:20070307T090000Z\r\n"))
-      << text;
 }
 
 TEST_F(CalendarsSync, AnOrganizerMissingFromTruthLeavesAnEmptyFileAndTheRunGoesOn) {
