@@ -78,23 +78,6 @@ TEST_F(PushDecision, TheSavedDateIsComparedAsAnInstant) {
   EXPECT_FALSE(rewritten());
 }
 
-TEST_F(PushDecision, APhotoSettingChangeIsPushedWithItsWording) {
-  settle();
-  const SyncOutcome on = sync(PlayerPhotos::Accepted);
-  EXPECT_TRUE(on.logged(
-      "Force pushing VCF because previous sync did not sync contact images and we have to sync "
-      "contact images now"));
-  EXPECT_TRUE(on.logged("Storing the fact we did sync contact images"));
-  EXPECT_EQ(client()->setting("DidSyncContactImages"), platform::Value::boolean(true));
-  EXPECT_TRUE(
-      sync(PlayerPhotos::Accepted)
-          .logged("Previous sync did sync contact images. Nothing has changed on this point"));
-  const SyncOutcome off = sync(PlayerPhotos::Refused);
-  EXPECT_TRUE(off.logged(
-      "Force pushing VCF because previous sync did sync contact images and we don't have to "
-      "sync contact images now"));
-}
-
 TEST_F(PushDecision, TheFirstReasonToPushEndsTheChain) {
   settle();
   std::filesystem::last_write_time(
@@ -250,6 +233,7 @@ TEST_F(PushDecision, EachReasonRewritesTheFileOnceAndSaysWhy) {
     const char* line;
     std::function<void()> arrange;
     std::string_view defaults = "";
+    PlayerPhotos photos = PlayerPhotos::Refused;
   } reasons[] = {
       {"List of contacts to push has changed",
        [this] {
@@ -265,6 +249,12 @@ TEST_F(PushDecision, EachReasonRewritesTheFileOnceAndSaysWhy) {
        [this] { client()->unsetSetting("DidSyncContactImages"); }},
       {"Force pushing VCF to be sure we are up to date with current sync tool version",
        [this] { client()->setSetting("LastSyncToolVersion", platform::Value::integer(39)); }},
+      {"Force pushing VCF because previous sync did not sync contact images and we have to sync "
+       "contact images now",
+       [] {}, "", PlayerPhotos::Accepted},
+      {"Force pushing VCF because previous sync did sync contact images and we don't have to "
+       "sync contact images now",
+       [] {}},
   };
   settle();
   for (const auto& reason : reasons) {
@@ -272,11 +262,11 @@ TEST_F(PushDecision, EachReasonRewritesTheFileOnceAndSaysWhy) {
     written_ = inode(vcfPath());
     reason.arrange();
     const bool removed = !std::filesystem::exists(vcfPath());
-    const SyncOutcome outcome = sync(PlayerPhotos::Refused, reason.defaults);
+    const SyncOutcome outcome = sync(reason.photos, reason.defaults);
     EXPECT_TRUE(outcome.logged(reason.line));
     EXPECT_FALSE(outcome.logged("Nothing to push for contacts..."));
     EXPECT_TRUE(removed ? std::filesystem::exists(vcfPath()) : rewritten());
-    EXPECT_TRUE(sync().logged("Nothing to push for contacts..."));
+    EXPECT_TRUE(sync(reason.photos).logged("Nothing to push for contacts..."));
   }
   EXPECT_NE(fileText().find("TEL;type=WORK:555-0199\r\n"), std::string::npos);
 }

@@ -27,7 +27,7 @@
 namespace zt::sync::test_support {
 namespace {
 
-constexpr int kContacts = 2000, kEvents = 1000, kGroups = 3, kCalendars = 4;
+constexpr int kContacts = 2000, kEvents = 1000, kCalendars = 4;
 const char* const kTitles[kCalendars] = {"Work", "Home", "Sport", "Family"};
 // Every this many contacts and events one differs between the two versions of the store.
 constexpr int kChangeEvery = 20;
@@ -79,8 +79,7 @@ std::vector<Json> records(int version, bool onlyChanged) {
                            {{"first name", "First" + n},
                             {"last name", (changed ? "Renamed" : "Last") + n},
                             {"notes", changed ? "Moved to the new office." : "Met at the fair."},
-                            {"phone numbers", {id + "-phone"}},
-                            {"parent groups", {"group-" + std::to_string(i % kGroups)}}}));
+                            {"phone numbers", {id + "-phone"}}}));
   }
   for (int i = 0; i < kEvents; ++i) {
     const bool changed = version == 1 && i % kChangeEvery == 0;
@@ -95,12 +94,6 @@ std::vector<Json> records(int version, bool onlyChanged) {
                 {"calendar", {"calendar-" + std::to_string(i % kCalendars)}}}));
   }
   if (onlyChanged) return lines;
-  for (int g = 0; g < kGroups; ++g) {
-    Json members = Json::array();
-    for (int i = g; i < kContacts; i += kGroups) members.push_back("contact-" + std::to_string(i));
-    lines.push_back(record("group-" + std::to_string(g), "tessel.contacts.Group",
-                           {{"name", "Group " + std::to_string(g)}, {"members", members}}));
-  }
   Json order = Json::array();
   for (int c = 0; c < kCalendars; ++c) {
     Json events = Json::array();
