@@ -122,26 +122,6 @@ TEST_F(CalendarsSync, UntitledCalendarsAreSkippedAndOneTitleMakesOneFile) {
   EXPECT_FALSE(contains(text, "Earlier")) << text;
 }
 
-TEST_F(CalendarsSync, ACalendarMissingFromTruthEndsTheCalendarsSyncWithAnError) {
-  // Deletes take a calendar out of the order, but a store written before they did may still
-  // name one that is gone.
-  putRecords({calendar("cal-home", "Home", {}),
-              record("tessel.calendars.order",
-                     Json{{"tessel.record.entity", "tessel.calendars.CalendarOrder"},
-                          {"calendars", {"cal-gone", "cal-home"}}})});
-  std::ofstream(calendarsFolder() / "stray.ics") << "x";
-
-  const SynctoolRun run = syncClient(kClientID);
-
-  EXPECT_EQ(run.finalStatus(), 2) << run.log;
-  EXPECT_TRUE(run.logged("Can't get calendar record in truth")) << run.log;
-  EXPECT_FALSE(run.logged("Commiting accepted changes")) << run.log;
-  // The folder was emptied, nothing after the missing calendar was written, and the
-  // calendars syncer still closed with 100 (the manager's own 100 is not posted).
-  EXPECT_TRUE(calendarFiles().empty());
-  EXPECT_EQ(uploadingProgress(run), (std::vector<double>{0, 34, 100}));
-}
-
 // Without an order record, or with one without its list (reported even without debug log),
 // calendars go in the engine's order.
 TEST_F(CalendarsSync, WithoutAUsableCalendarOrderCalendarsGoInTheEnginesOrder) {
@@ -178,41 +158,82 @@ TEST_F(CalendarsSync, TheFilterSelectsCalendarsAndTheUsersOrderIsKept) {
   EXPECT_TRUE(run.logContains("Filtered calendar IDs are:\n(cal-c, cal-a)")) << run.log;
 }
 
-TEST_F(CalendarsSync, AnOrganizerMissingFromTruthLeavesAnEmptyFileAndTheRunGoesOn) {
-  Json broken = event("ev-broken", "Broken", "2007-03-05T09:00:00");
-  broken["record"]["organizer"] = Json::array({"org-missing"});
-  putRecords({calendar("cal-broken", "Broken", {"ev-broken"}),
-              calendar("cal-fine", "Fine", {"ev-fine"}), broken,
-              event("ev-fine", "Fine", "2007-03-06T09:00:00")});
-  tessel({"calendars", "order", "cal-broken", "cal-fine"});
+// Failures end the run with status 2 and say why; the calendars syncer still closes with 100
+// (the manager's own 100 is posted only when the run goes on).
+struct Failure {
+  const char* name;
+  std::vector<Json> records;
+  std::vector<std::string> order;
+  std::string line;
+  std::vector<std::string> files;
+  std::vector<double> progress;
+};
 
-  const SynctoolRun run = syncClient(kClientID);
-
-  EXPECT_TRUE(run.logContains("Exception while disassembling data:\n")) << run.log;
-  EXPECT_TRUE(fs::exists(calendarsFolder() / "Tessel-Broken.ics"));
-  EXPECT_EQ(fs::file_size(calendarsFolder() / "Tessel-Broken.ics"), 0u);
-  EXPECT_TRUE(contains(calendarFile("Tessel-Fine.ics"), "SUMMARY:Fine\r\n"));
-  EXPECT_EQ(uploadingProgress(run), (std::vector<double>{0, 34, 50.5, 67, 83.5, 100, 100, 100}));
-  // The failure is remembered: the session is cancelled and the run reports an error.
-  EXPECT_EQ(run.finalStatus(), 2) << run.log;
+void PrintTo(const Failure& failure, std::ostream* out) {
+  *out << failure.name;
 }
 
-TEST_F(CalendarsSync, AFileThePlayerRefusesEndsTheCalendarsSyncWithAWriteError) {
-  // Longer than a file name may be: the write fails.
-  const std::string title(300, 'x');
-  putRecords({calendar("cal-long", title, {}), calendar("cal-home", "Home", {})});
-  tessel({"calendars", "order", "cal-long", "cal-home"});
+class CalendarsFailure : public CalendarsSync, public ::testing::WithParamInterface<Failure> {};
 
+TEST_P(CalendarsFailure, EndsTheSyncWithStatusTwo) {
+  putRecords(GetParam().records);
+  if (!GetParam().order.empty()) {
+    std::vector<std::string> command = {"calendars", "order"};
+    command.insert(command.end(), GetParam().order.begin(), GetParam().order.end());
+    tessel(command);
+  }
+  std::ofstream(calendarsFolder() / "stray.ics") << "x";
   const SynctoolRun run = syncClient(kClientID);
-
   EXPECT_EQ(run.finalStatus(), 2) << run.log;
-  EXPECT_TRUE(run.logged("Can't write calendar at path " +
-                         (calendarsFolder() / ("Tessel-" + title + ".ics")).string()))
-      << run.log;
-  EXPECT_TRUE(calendarFiles().empty());
-  // The first step is reported before the write, the closing 100 after the failure.
-  EXPECT_EQ(uploadingProgress(run), (std::vector<double>{0, 34, 50.5, 100}));
+  EXPECT_TRUE(run.logContains(GetParam().line)) << run.log;
+  EXPECT_EQ(calendarFiles(), GetParam().files);
+  EXPECT_EQ(uploadingProgress(run), GetParam().progress);
+  // A failure before any write commits nothing; one while building a calendar is remembered
+  // and cancels the session at the end.
+  EXPECT_EQ(run.logged("Commiting accepted changes"), !GetParam().files.empty()) << run.log;
+  if (!GetParam().files.empty()) {
+    EXPECT_EQ(fs::file_size(calendarsFolder() / "Tessel-Broken.ics"), 0u);
+    EXPECT_TRUE(contains(calendarFile("Tessel-Fine.ics"), "SUMMARY:Fine\r\n"));
+  }
 }
+
+Json withMissingOrganizer(Json event) {
+  event["record"]["organizer"] = Json::array({"org-missing"});
+  return event;
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Each, CalendarsFailure,
+    ::testing::Values(
+        // Deletes take a calendar out of the order, but a store written before they did may
+        // still name one that is gone: nothing after it is written.
+        Failure{"CalendarMissingFromTruth",
+                {calendar("cal-home", "Home", {}),
+                 record("tessel.calendars.order",
+                        Json{{"tessel.record.entity", "tessel.calendars.CalendarOrder"},
+                             {"calendars", {"cal-gone", "cal-home"}}})},
+                {},
+                "Can't get calendar record in truth",
+                {},
+                {0, 34, 100}},
+        // The broken calendar leaves an empty file and the next one is still written.
+        Failure{"OrganizerMissingFromTruth",
+                {calendar("cal-broken", "Broken", {"ev-broken"}),
+                 calendar("cal-fine", "Fine", {"ev-fine"}),
+                 withMissingOrganizer(event("ev-broken", "Broken", "2007-03-05T09:00:00")),
+                 event("ev-fine", "Fine", "2007-03-06T09:00:00")},
+                {"cal-broken", "cal-fine"},
+                "Exception while disassembling data:\n",
+                {"Tessel-Broken.ics", "Tessel-Fine.ics"},
+                {0, 34, 50.5, 67, 83.5, 100, 100, 100}},
+        // Longer than a file name may be: the first step is reported before the write.
+        Failure{"FileThePlayerRefuses",
+                {calendar("cal-long", std::string(300, 'x'), {}), calendar("cal-home", "Home", {})},
+                {"cal-long", "cal-home"},
+                "Can't write calendar at path ",
+                {},
+                {0, 34, 50.5, 100}}),
+    [](const ::testing::TestParamInfo<Failure>& failure) { return failure.param.name; });
 
 }  // namespace
 }  // namespace zt::sync::test_support
