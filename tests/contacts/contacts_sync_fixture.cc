@@ -9,18 +9,6 @@
 
 namespace zt::contacts::testing {
 
-namespace {}  // namespace
-
-bool SyncOutcome::logged(std::string_view line) const {
-  return count(line) > 0;
-}
-
-std::size_t SyncOutcome::count(std::string_view line) const {
-  std::size_t n = 0;
-  for (const std::string& written : log) n += written == line ? 1 : 0;
-  return n;
-}
-
 void ContactsSyncTest::SetUp() {
   std::filesystem::create_directories(folder_ / "vol");
   const std::filesystem::path devices = folder_ / "devices.json";
@@ -38,14 +26,6 @@ void ContactsSyncTest::SetUp() {
 
 void ContactsSyncTest::put(std::string_view jsonLines) {
   store_->putRecords(tessel::parseRecordLines(jsonLines));
-}
-
-std::unique_ptr<tessel::Client> ContactsSyncTest::client() const {
-  return store_->clientWithIdentifier(kClientID);
-}
-
-std::string ContactsSyncTest::dataFile(std::string_view name) {
-  return zt::test_support::readFile(std::filesystem::path(ZT_TEST_DATA_DIR) / "data" / name);
 }
 
 SyncOutcome ContactsSyncTest::sync(PlayerPhotos photos, std::string_view defaults,
@@ -76,10 +56,6 @@ SyncOutcome ContactsSyncTest::sync(PlayerPhotos photos, std::string_view default
     }
   }
   return outcome;
-}
-
-std::string ContactsSyncTest::fileBytes() const {
-  return zt::test_support::readFile(vcfPath());
 }
 
 }  // namespace zt::contacts::testing

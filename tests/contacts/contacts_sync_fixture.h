@@ -2,6 +2,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cstdint>
 #include <filesystem>
 #include <functional>
@@ -10,7 +11,6 @@
 #include <string_view>
 #include <vector>
 
-#include "platform/notification_center.h"
 #include "support/captured_log.h"
 #include "support/files.h"
 #include "support/scoped_environment.h"
@@ -18,32 +18,26 @@
 #include "sync/data_class_syncer.h"
 #include "sync/zt_sync_manager.h"
 #include "tessel/client.h"
-#include "tessel/record.h"
 #include "tessel/store.h"
 
 namespace zt::contacts::testing {
 
 inline constexpr std::string_view kClientID = "000A27001A2B3C4D";
 
-using zt::test_support::readFile;
-// The cards of a contacts file as UTF-8, checking its byte-order mark and UTF-16BE form.
-inline std::string cardsOf(const std::string& bytes) {
-  return zt::test_support::utf8OfUtf16BigEndian(bytes);
-}
-
 // Whether the virtual player takes contact pictures.
 enum class PlayerPhotos { Refused, Accepted };
 
-// What one sync left behind.
+// What one sync left behind: its status, the log lines written during the run and the
+// percentages of its "TesselClientUploadingPhase" notifications.
 struct SyncOutcome {
   std::int32_t lastStatus = 0;
-  // The log lines written during the run.
   std::vector<std::string> log;
-  // The percentages of the "TesselClientUploadingPhase" notifications, in order.
   std::vector<double> uploadingProgress;
 
-  bool logged(std::string_view line) const;
-  std::size_t count(std::string_view line) const;
+  std::size_t count(std::string_view line) const {
+    return static_cast<std::size_t>(std::count(log.begin(), log.end(), line));
+  }
+  bool logged(std::string_view line) const { return count(line) > 0; }
 };
 
 // One virtual player whose volume is a fresh folder, a store with a client registered for
@@ -55,7 +49,7 @@ class ContactsSyncTest : public ::testing::Test {
 
   // Puts records given as typed JSON lines.
   void put(std::string_view jsonLines);
-  std::unique_ptr<tessel::Client> client() const;
+  std::unique_ptr<tessel::Client> client() const { return store_->clientWithIdentifier(kClientID); }
 
   using SyncerMaker = std::function<std::unique_ptr<sync::ContactsSyncing>(sync::ZTSyncManager&)>;
   SyncOutcome sync(PlayerPhotos photos = PlayerPhotos::Refused, std::string_view defaults = "",
@@ -63,11 +57,12 @@ class ContactsSyncTest : public ::testing::Test {
 
   std::filesystem::path contactsFolder() const { return folder_ / "vol" / "Contacts"; }
   std::filesystem::path vcfPath() const { return contactsFolder() / "Tessel.vcf"; }
-  std::string fileBytes() const;
+  std::string fileBytes() const { return zt::test_support::readFile(vcfPath()); }
   // The file's cards as UTF-8 after its byte-order mark, which must be there.
-  std::string fileText() const { return cardsOf(fileBytes()); }
-
-  static std::string dataFile(std::string_view name);
+  std::string fileText() const { return zt::test_support::utf8OfUtf16BigEndian(fileBytes()); }
+  static std::string dataFile(std::string_view name) {
+    return zt::test_support::readFile(std::filesystem::path(ZT_TEST_DATA_DIR) / "data" / name);
+  }
 
   zt::test_support::TemporaryFolder folder_;
   zt::test_support::ScopedEnvironment environment_;
@@ -76,7 +71,7 @@ class ContactsSyncTest : public ::testing::Test {
   std::unique_ptr<tessel::Store> store_;
 
  private:
-  std::uintmax_t logOffset_ = 0;
+  std::size_t logOffset_ = 0;
 };
 
 }  // namespace zt::contacts::testing

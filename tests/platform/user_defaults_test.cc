@@ -40,7 +40,7 @@ TEST(UserDefaults, ReadsBooleansInEveryFormAndSkipsWhatIsNotOne) {
   for (const auto& [key, value] : booleans) EXPECT_EQ(defaults.boolForKey(key), value) << key;
   EXPECT_EQ(defaults.stringForKey("Hash"), "a#b");
   EXPECT_EQ(defaults.stringForKey("Split"), "a = b");
-  EXPECT_TRUE(log.contains("Maybe")) << log.text();
+  EXPECT_NE(log.text().find("Maybe"), std::string::npos) << log.text();
 }
 
 TEST(UserDefaults, FileLocationFollowsTheEnvironment) {

@@ -38,7 +38,6 @@ class CapturedLog {
     return static_cast<std::size_t>(std::count(all.begin(), all.end(), line));
   }
   bool has(std::string_view line) const { return count(line) > 0; }
-  bool contains(std::string_view part) const { return text().find(part) != std::string::npos; }
   std::string last() const {
     const std::vector<std::string> all = lines();
     return all.empty() ? std::string() : all.back();

@@ -14,16 +14,21 @@ struct Unref {
 };
 using Owned = std::unique_ptr<VipsImage, Unref>;
 
-// Runs one libvips operation on `image`, replacing it with the result; false on failure.
-template <typename Operation>
-bool step(Owned& image, Operation operation) {
-  VipsImage* out = nullptr;
-  if (operation(image.get(), &out) != 0 || !out) {
-    vips_error_clear();
-    return false;
+int encode(VipsImage* image, const PictureRecipe& recipe, void** buffer, std::size_t* length) {
+  switch (recipe.format) {
+    case PictureFormat::JPEG:
+      return vips_jpegsave_buffer(image, buffer, length, "Q", recipe.jpegQuality, "strip", TRUE,
+                                  nullptr);
+    case PictureFormat::PNG:
+      return vips_pngsave_buffer(image, buffer, length, nullptr);
+    case PictureFormat::GIF:
+      return vips_gifsave_buffer(image, buffer, length, nullptr);
+    case PictureFormat::WebP:
+      return vips_webpsave_buffer(image, buffer, length, "lossless", TRUE, "strip", TRUE, nullptr);
+    case PictureFormat::TIFF:
+      return vips_tiffsave_buffer(image, buffer, length, nullptr);
   }
-  image.reset(out);
-  return true;
+  return -1;
 }
 
 }  // namespace
@@ -34,90 +39,44 @@ std::optional<Data> makePicture(const PictureRecipe& recipe) {
           platform::makeImageService())) {
     return std::nullopt;
   }
-  const int width = recipe.size.width;
-  const int height = recipe.size.height;
-  VipsImage* start = nullptr;
-  if (vips_xyz(&start, width, height, nullptr) != 0) {
-    vips_error_clear();
-    return std::nullopt;
+  const int width = recipe.size.width, height = recipe.size.height;
+  // Each step replaces the picture with the result of one libvips operation.
+  Owned image;
+  const auto step = [&image](auto operation) {
+    VipsImage* out = nullptr;
+    if (operation(image.get(), &out) != 0 || !out) return false;
+    image.reset(out);
+    return true;
+  };
+  // Flat: one colour; otherwise red grows to the right and green downwards.
+  const bool flat = recipe.pattern == PicturePattern::Flat;
+  double scale[] = {flat ? 0.0 : 255.0 / std::max(1, width),
+                    flat ? 0.0 : 255.0 / std::max(1, height)};
+  double offset[] = {flat ? 200.0 : 0.0, flat ? 120.0 : 0.0};
+  bool made =
+      step([&](VipsImage*, VipsImage** out) { return vips_xyz(out, width, height, nullptr); }) &&
+      step([&](VipsImage* in, VipsImage** out) {
+        return vips_linear(in, out, scale, offset, 2, nullptr);
+      }) &&
+      step([](VipsImage* in, VipsImage** out) {
+        return vips_bandjoin_const1(in, out, 64.0, nullptr);
+      });
+  if (made && recipe.pattern == PicturePattern::Noise) {
+    VipsImage* noise = nullptr;
+    made = vips_gaussnoise(&noise, width, height, "mean", 0.0, "sigma", 48.0, nullptr) == 0;
+    Owned noisy(noise);
+    made = made && step([&](VipsImage* in, VipsImage** out) {
+             return vips_add(in, noisy.get(), out, nullptr);
+           });
   }
-  Owned image(start);
-  const bool made = [&] {
-    if (recipe.pattern == PicturePattern::Flat) {
-      double scale[] = {0.0, 0.0};
-      double offset[] = {200.0, 120.0};
-      if (!step(image, [&](VipsImage* in, VipsImage** out) {
-            return vips_linear(in, out, scale, offset, 2, nullptr);
-          })) {
-        return false;
-      }
-    } else {
-      // Red grows to the right, green downwards.
-      double scale[] = {255.0 / std::max(1, width), 255.0 / std::max(1, height)};
-      double offset[] = {0.0, 0.0};
-      if (!step(image, [&](VipsImage* in, VipsImage** out) {
-            return vips_linear(in, out, scale, offset, 2, nullptr);
-          })) {
-        return false;
-      }
-    }
-    if (!step(image, [](VipsImage* in, VipsImage** out) {
-          return vips_bandjoin_const1(in, out, 64.0, nullptr);
-        })) {
-      return false;
-    }
-    if (recipe.pattern == PicturePattern::Noise) {
-      VipsImage* noise = nullptr;
-      if (vips_gaussnoise(&noise, width, height, "mean", 0.0, "sigma", 48.0, nullptr) != 0) {
-        vips_error_clear();
-        return false;
-      }
-      Owned noisy(noise);
-      if (!step(image, [&](VipsImage* in, VipsImage** out) {
-            return vips_add(in, noisy.get(), out, nullptr);
-          })) {
-        return false;
-      }
-    }
-    const bool alphaFormat = recipe.format == PictureFormat::PNG ||
-                             recipe.format == PictureFormat::WebP ||
-                             recipe.format == PictureFormat::TIFF;
-    if (alphaFormat && recipe.alpha == PictureAlpha::HalfTransparent &&
-        !step(image, [](VipsImage* in, VipsImage** out) {
-          return vips_bandjoin_const1(in, out, 128.0, nullptr);
-        })) {
-      return false;
-    }
-    if (!step(image,
-              [](VipsImage* in, VipsImage** out) { return vips_cast_uchar(in, out, nullptr); })) {
-      return false;
-    }
-    return step(image, [](VipsImage* in, VipsImage** out) {
-      return vips_copy(in, out, "interpretation", VIPS_INTERPRETATION_sRGB, nullptr);
-    });
-  }();
-  if (!made) return std::nullopt;
-
+  made = made &&
+         step([](VipsImage* in, VipsImage** out) { return vips_cast_uchar(in, out, nullptr); }) &&
+         step([](VipsImage* in, VipsImage** out) {
+           return vips_copy(in, out, "interpretation", VIPS_INTERPRETATION_sRGB, nullptr);
+         });
   void* buffer = nullptr;
   std::size_t length = 0;
-  const int failed = [&] {
-    switch (recipe.format) {
-      case PictureFormat::JPEG:
-        return vips_jpegsave_buffer(image.get(), &buffer, &length, "Q", recipe.jpegQuality, "strip",
-                                    TRUE, nullptr);
-      case PictureFormat::PNG:
-        return vips_pngsave_buffer(image.get(), &buffer, &length, nullptr);
-      case PictureFormat::GIF:
-        return vips_gifsave_buffer(image.get(), &buffer, &length, nullptr);
-      case PictureFormat::WebP:
-        return vips_webpsave_buffer(image.get(), &buffer, &length, "lossless", TRUE, "strip", TRUE,
-                                    nullptr);
-      case PictureFormat::TIFF:
-        return vips_tiffsave_buffer(image.get(), &buffer, &length, nullptr);
-    }
-    return -1;
-  }();
-  if (failed != 0) {
+  if (!made || encode(image.get(), recipe, &buffer, &length) != 0) {
     vips_error_clear();
     return std::nullopt;
   }

@@ -14,13 +14,11 @@ using platform::PixelSize;
 enum class PictureFormat { JPEG, PNG, GIF, WebP, TIFF };
 // Flat pictures compress to almost nothing; noisy ones are as large as photographs get.
 enum class PicturePattern { Flat, Gradient, Noise };
-enum class PictureAlpha { None, HalfTransparent };
 
 struct PictureRecipe {
   PixelSize size;
   PictureFormat format = PictureFormat::JPEG;
   PicturePattern pattern = PicturePattern::Gradient;
-  PictureAlpha alpha = PictureAlpha::None;  // PNG, WebP and TIFF only
   int jpegQuality = 75;
 };
 

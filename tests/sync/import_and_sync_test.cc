@@ -44,23 +44,18 @@ class ImportAndSync : public SynctoolTest {
     setEnvironment("TZ", "Europe/Paris");
   }
   void importSamples() {
-    TesselRun run = runTessel({"import", "vcard",
-                               (kSamples / "contacts" / "friends-and-colleagues.vcf").string(),
-                               (kSamples / "contacts" / "old-phone.vcf").string(),
-                               (kSamples / "contacts" / "family-vdir").string()});
-    ASSERT_EQ(run.exitStatus, 0) << run.output;
-    run = runTessel({"import", "ical", (kSamples / "calendars" / "work.ics").string(),
-                     (kSamples / "calendars" / "home.ics").string(),
-                     (kSamples / "calendars" / "holidays.ics").string()});
-    ASSERT_EQ(run.exitStatus, 0) << run.output;
+    tessel({"import", "vcard", (kSamples / "contacts" / "friends-and-colleagues.vcf").string(),
+            (kSamples / "contacts" / "old-phone.vcf").string(),
+            (kSamples / "contacts" / "family-vdir").string()});
+    tessel({"import", "ical", (kSamples / "calendars" / "work.ics").string(),
+            (kSamples / "calendars" / "home.ics").string(),
+            (kSamples / "calendars" / "holidays.ics").string()});
   }
 };
 
 TEST_F(ImportAndSync, ExportedAddressBooksAndCalendarsLandIntactAndSyncOnceOnly) {
   importSamples();
-  ASSERT_EQ(runTessel({"client", "register", std::string(kClientID), "--contacts", "--calendars"})
-                .exitStatus,
-            0);
+  tessel({"client", "register", std::string(kClientID), "--contacts", "--calendars"});
   Player player{std::string(kPlayerID)};
   player.checkpoint = kSamples / "zeto" / "self-description.plist";
   setPlayers({player});
@@ -106,16 +101,15 @@ TEST_F(ImportAndSync, ExportedAddressBooksAndCalendarsLandIntactAndSyncOnceOnly)
 }
 
 TEST_F(ImportAndSync, DeletingAnOrganizerLeavesItsCalendarWhole) {
-  ASSERT_EQ(
-      runTessel({"import", "ical", (kSamples / "calendars" / "work.ics").string()}).exitStatus, 0);
-  ASSERT_EQ(runTessel({"client", "register", std::string(kClientID), "--calendars"}).exitStatus, 0);
+  tessel({"import", "ical", (kSamples / "calendars" / "work.ics").string()});
+  tessel({"client", "register", std::string(kClientID), "--calendars"});
   ASSERT_EQ(syncClient(kClientID).finalStatus(), 0);
 
   std::vector<std::string> deleteCommand{"records", "delete"};
   store().forEachRecord([&](const tessel::Record& r) { deleteCommand.push_back(r.id); },
                         tessel::TesselEntity_Calendars_Organizer);
   ASSERT_EQ(deleteCommand.size(), 4u);  // both organizers
-  ASSERT_EQ(runTessel(deleteCommand).exitStatus, 0);
+  tessel(deleteCommand);
 
   SynctoolRun run = syncClient(kClientID);
   ASSERT_EQ(run.finalStatus(), 0) << run.log;

@@ -3,22 +3,11 @@
 // program's twenty.
 #include <gtest/gtest.h>
 
-#include <algorithm>
 #include <chrono>
 #include <fstream>
-#include <sstream>
-#include <string>
-#include <vector>
 
-#include "platform/file_system.h"
-#include "platform/log.h"
-#include "platform/notification_center.h"
-#include "platform/run_loop.h"
-#include "platform/user_defaults.h"
-#include "platform/virtual/virtual_device_library.h"
-#include "support/scoped_environment.h"
-#include "support/temporary_folder.h"
-#include "sync/sync_services.h"
+#include "support/captured_log.h"
+#include "support/in_process_sync.h"
 #include "sync/sync_status.h"
 #include "sync/zt_sync_manager.h"
 #include "tessel/store.h"
@@ -27,63 +16,21 @@ namespace zt::sync {
 namespace {
 
 namespace fs = std::filesystem;
-
 constexpr std::string_view kClientID = "000A27001A2B3C4D";
 
-class RecordingCenter final : public platform::NotificationCenter {
- public:
-  void post(std::string_view name, std::string_view sender,
-            const platform::Dictionary& userInfo) override {
-    posted.push_back({std::string(name), std::string(sender), userInfo});
-  }
-  std::vector<platform::Notification> posted;
-};
-
-std::vector<std::string> lines(const fs::path& path) {
-  std::ifstream in(path);
-  std::vector<std::string> result;
-  for (std::string line; std::getline(in, line);) result.push_back(line);
-  return result;
-}
-
-class MountGiveUp : public ::testing::Test {
- protected:
-  void SetUp() override {
-    fs::create_directories(folder_ / "vol");
-    std::ofstream(folder_ / "devices.json")
-        << R"([{"id": ")" << kClientID << R"(", "volume": ")" << (folder_ / "vol").string()
-        << R"(", "mounted": false}])";
-    environment_.set("XDG_RUNTIME_DIR", folder_.path().string());
-    environment_.set("ZETOSYNCTOOL_LOG", (folder_ / "log").string());
-    platform::Log::configureFromEnvironment();
-    platform::Log::setDebugEnabled(true);
-    auto store = tessel::Store::open(folder_ / "truth.db");
-    store->registerClient(kClientID, "Zeto", ZTSyncManager::entitiesForContacts());
-  }
-
-  void TearDown() override {
-    platform::Log::setDebugEnabled(false);
-    environment_.unset("ZETOSYNCTOOL_LOG");
-    platform::Log::configureFromEnvironment();
-  }
-
-  test_support::TemporaryFolder folder_;
-  test_support::ScopedEnvironment environment_;
-};
-
-TEST_F(MountGiveUp, AVolumeThatNeverMountsIsGivenUpAfterTheWait) {
-  platform::VirtualDeviceLibrary devices((folder_ / "devices.json").string());
-  RecordingCenter center;
-  const platform::UserDefaults defaults = platform::UserDefaults::fromText("");
-  const platform::FileSystem files;
-  SyncServices services{devices,
-                        center,
-                        defaults,
-                        files,
-                        platform::RunLoop::current(),
-                        folder_ / "truth.db",
-                        SyncerMakers{},
-                        [](const std::string&) { return false; }};
+TEST(MountGiveUp, AVolumeThatNeverMountsIsGivenUpAfterTheWaitWithTheLockGivenBack) {
+  test_support::CapturedLog log;
+  test_support::TemporaryFolder folder;
+  test_support::ScopedEnvironment environment;
+  environment.set("XDG_RUNTIME_DIR", folder.path().string());
+  fs::create_directories(folder / "vol");
+  std::ofstream(folder / "devices.json") << R"([{"id": ")" << kClientID << R"(", "volume": ")"
+                                         << (folder / "vol").string() << R"(", "mounted": false}])";
+  tessel::Store::open(folder / "truth.db")
+      ->registerClient(kClientID, "Zeto", ZTSyncManager::entitiesForContacts());
+  test_support::InProcessSync inProcess(folder / "devices.json", "");
+  SyncServices services = inProcess.services(folder / "truth.db", SyncerMakers{},
+                                             [](const std::string&) { return false; });
   EXPECT_EQ(services.mountWaitSeconds, 20.0) << "the program waits twenty seconds";
   services.mountWaitSeconds = 0.3;
 
@@ -94,35 +41,28 @@ TEST_F(MountGiveUp, AVolumeThatNeverMountsIsGivenUpAfterTheWait) {
     manager.doSync();
     lastStatus = manager.lastStatus();
   }
-  const double seconds =
-      std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
+  const std::chrono::duration<double> waited = std::chrono::steady_clock::now() - start;
+  EXPECT_GE(waited.count(), 0.3);
+  EXPECT_LT(waited.count(), 5.0);
 
-  // It waited the whole time, and no longer than that by much.
-  EXPECT_GE(seconds, 0.3);
-  EXPECT_LT(seconds, 5.0);
-
-  const std::vector<std::string> log = lines(folder_ / "log");
-  std::ostringstream text;
-  for (const std::string& line : log) text << line << '\n';
-  const auto at = [&log](std::string_view line) {
-    return std::find(log.begin(), log.end(), line) - log.begin();
-  };
-  const auto end = static_cast<std::ptrdiff_t>(log.size());
   // The lock is taken before the wait, the wait gives up, and the lock is given back.
-  EXPECT_LT(at("Locking Zeto"), at("Needing to mount Zeto")) << text.str();
-  EXPECT_LT(at("Needing to mount Zeto"), at("Time outing mounting Zeto")) << text.str();
-  EXPECT_LT(at("Time outing mounting Zeto"), at("Unlocking Zeto")) << text.str();
-  EXPECT_LT(at("Unlocking Zeto"), end) << text.str();
-
+  const std::vector<std::string> lines = log.lines();
+  std::vector<std::string> steps;
+  for (const std::string& line : lines) {
+    if (line == "Locking Zeto" || line == "Needing to mount Zeto" ||
+        line == "Time outing mounting Zeto" || line == "Unlocking Zeto")
+      steps.push_back(line);
+  }
+  EXPECT_EQ(steps, (std::vector<std::string>{"Locking Zeto", "Needing to mount Zeto",
+                                             "Time outing mounting Zeto", "Unlocking Zeto"}))
+      << log.text();
   EXPECT_EQ(lastStatus, kStatusDeviceUnavailable);
-  ASSERT_EQ(center.posted.size(), 2u);
-  const platform::Value* status = center.posted.back().userInfo.find("TesselClientStatus");
-  ASSERT_TRUE(status && status->asNumber());
-  EXPECT_EQ(status->asNumber()->int64Value(), 3);
-
+  ASSERT_EQ(inProcess.posted().size(), 2u);
+  EXPECT_EQ(*inProcess.posted().back().userInfo.find("TesselClientStatus"),
+            platform::Value::integer(3));
   // Nothing was written, and the engine has no session for the client.
-  EXPECT_TRUE(fs::is_empty(folder_ / "vol"));
-  EXPECT_FALSE(tessel::Store::open(folder_ / "truth.db")
+  EXPECT_TRUE(fs::is_empty(folder / "vol"));
+  EXPECT_FALSE(tessel::Store::open(folder / "truth.db")
                    ->clientWithIdentifier(kClientID)
                    ->lastSession()
                    .has_value());

@@ -20,39 +20,25 @@ using zt::test_support::readFile;
 
 using PlayerVolume = SynctoolTest;
 
-TEST_F(PlayerVolume, AVolumeMountingLateIsAwaitedAndThenSynced) {
+TEST_F(PlayerVolume, AVolumeMountingLateIsAwaitedAndEventsOfAnotherPlayerDoNotEndTheWait) {
   registerClient(kClientID, false, false);
-  setPlayers({Player::mountingAfter(std::string(kPlayerID), 1.5)});
+  const fs::path other = folder() / "other";
+  fs::create_directories(other);
+  Player early = Player::mountingAfter("BEEF", 0.2);
+  early.volume = other;
+  setPlayers({early, Player::mountingAfter(std::string(kPlayerID), 1.5)});
   const SynctoolRun run = syncClient(kClientID);
-  EXPECT_EQ(run.exitStatus, 0);
   EXPECT_EQ(run.finalStatus(), 0) << run.log;
-  // The player turns up and mounts while the tool waits, in that order.
+  // Only this player's own arrival and mount are noted, in that order, while the tool waits.
   const auto needing = run.lineIndex("Needing to mount Zeto");
   const auto attached = run.lineIndex("Zeto attached");
   const auto mounted = run.lineIndex("Zeto mounted");
   ASSERT_TRUE(needing && attached && mounted) << run.log;
   EXPECT_LT(*needing, *attached);
   EXPECT_LT(*attached, *mounted);
-  EXPECT_FALSE(run.logged("Time outing mounting Zeto"));
-  EXPECT_GE(run.seconds, 1.5);
-  EXPECT_TRUE(fs::is_directory(volume() / "Contacts"));
-  EXPECT_TRUE(fs::is_directory(volume() / "Calendars"));
-  EXPECT_EQ(run.notifications.size(), 5u);
-}
-
-TEST_F(PlayerVolume, EventsOfAnotherPlayerDoNotEndTheWait) {
-  registerClient(kClientID, false, false);
-  const fs::path other = folder() / "other";
-  fs::create_directories(other);
-  Player early = Player::mountingAfter("BEEF", 0.2);
-  early.volume = other;
-  setPlayers({early, Player::mountingAfter(std::string(kPlayerID), 1.0)});
-  const SynctoolRun run = syncClient(kClientID);
-  EXPECT_EQ(run.finalStatus(), 0) << run.log;
-  // Only this player's own arrival is noted, and its own volume is used.
   EXPECT_EQ(std::count(run.logLines.begin(), run.logLines.end(), "Zeto attached"), 1);
   EXPECT_EQ(std::count(run.logLines.begin(), run.logLines.end(), "Zeto mounted"), 1);
-  EXPECT_FALSE(run.logged("Can't get Zeto mount point"));
+  EXPECT_GE(run.seconds, 1.5);
   EXPECT_TRUE(fs::is_directory(volume() / "Contacts"));
   EXPECT_FALSE(fs::exists(other / "Contacts"));
 }
@@ -61,9 +47,9 @@ TEST_F(PlayerVolume, EventsOfAnotherPlayerDoNotEndTheWait) {
 
 TEST_F(PlayerVolume, ARegularFileNamedContactsTurnsContactsOffButNotTheRun) {
   registerClient(kClientID, true, true);
-  const fs::path home =
-      fs::path(ZT_TEST_DATA_DIR) / ".." / ".." / "samples" / "calendars" / "home.ics";
-  ASSERT_EQ(runTessel({"import", "ical", home.string()}).exitStatus, 0);
+  tessel(
+      {"import", "ical",
+       (fs::path(ZT_TEST_DATA_DIR) / ".." / ".." / "samples" / "calendars" / "home.ics").string()});
   std::ofstream(volume() / "Contacts") << "not a folder";
   const SynctoolRun run = syncClient(kClientID);
   EXPECT_EQ(run.exitStatus, 0);
@@ -93,11 +79,8 @@ using zt::test_support::namesIn;
 
 TEST_F(PlayerVolume, ALinkInPlaceOfAFolderTurnsItsDataClassOffAndLeadsNowhere) {
   registerClient(kClientID, true, true);
-  std::ofstream(folder() / "records.jsonl")
-      << R"({"id": "cal-home", "record": {"tessel.record.entity": "tessel.calendars.Calendar", "title": "Home"}})"
-      << "\n";
-  const TesselRun put = runTessel({"records", "put", (folder() / "records.jsonl").string()});
-  ASSERT_EQ(put.exitStatus, 0) << put.output;
+  putRecords({Json::parse(
+      R"({"id": "cal-home", "record": {"tessel.record.entity": "tessel.calendars.Calendar", "title": "Home"}})")});
 
   // A link to a folder of the user's, as a player formatted on another system may hold.
   const fs::path outside = folder() / "outside";
@@ -148,83 +131,52 @@ TEST_F(PlayerVolume, TemporariesLeftByAnInterruptedWriteAreRemovedByTheNextPush)
 
 using PlayerLock = SynctoolTest;
 
-TEST_F(PlayerLock, APlayerLockedByAnotherProcessIsNotSynced) {
+// A sync started by cron, a systemd unit or another login has a runtime folder and home of its
+// own, and still must not write to the player at the same time as this one.
+TEST_F(PlayerLock, APlayerLockedByAnotherProcessOfAnyEnvironmentIsNotSynced) {
   registerClient(kClientID, false, false);
-  {
-    LockHolder holder(environment(), kPlayerNumber);
+  fs::create_directories(folder() / "other/run");
+  auto otherSession = environment();
+  otherSession["HOME"] = (folder() / "other").string();
+  otherSession["XDG_RUNTIME_DIR"] = (folder() / "other/run").string();
+  for (const auto& holderEnvironment : {environment(), otherSession}) {
+    LockHolder holder(holderEnvironment, kPlayerNumber);
     ASSERT_EQ(holder.result(), platform::kZetoSuccess);
     const SynctoolRun run = syncClient(kClientID);
-    EXPECT_EQ(run.exitStatus, 0);
-    EXPECT_TRUE(run.logged("Locking Zeto")) << run.log;
     EXPECT_TRUE(run.logged("Can't get a lock on Zeto")) << run.log;
-    ASSERT_EQ(run.notifications.size(), 2u);
     EXPECT_EQ(run.finalStatus(), 3);
     EXPECT_FALSE(client(kClientID)->lastSession().has_value());
     EXPECT_FALSE(fs::exists(volume() / "Contacts"));
     // A lock it never took is not given back.
     EXPECT_FALSE(run.logged("Unlocking Zeto"));
   }
-  // Once the other process lets go, the player syncs.
-  const SynctoolRun run = syncClient(kClientID);
-  EXPECT_EQ(run.finalStatus(), 0) << run.log;
-  EXPECT_TRUE(run.logged("Unlocking Zeto"));
-
-  // And a sync that ended has left the lock free for the next user.
+  // Once the other process lets go, the player syncs, and the sync leaves the lock free.
+  EXPECT_EQ(syncClient(kClientID).finalStatus(), 0);
   LockHolder next(environment(), kPlayerNumber);
   EXPECT_EQ(next.result(), platform::kZetoSuccess);
 }
 
-TEST_F(PlayerLock, AnotherUsersSyncHoldsTheSameLock) {
-  // A sync started by cron, a systemd unit or another login has a runtime folder and home of
-  // its own, and still must not write to the player at the same time.
-  registerClient(kClientID, false, false);
-  fs::create_directories(folder() / "other/run");
-  auto otherSession = environment();
-  otherSession["HOME"] = (folder() / "other").string();
-  otherSession["XDG_RUNTIME_DIR"] = (folder() / "other/run").string();
-  LockHolder holder(otherSession, kPlayerNumber);
-  ASSERT_EQ(holder.result(), platform::kZetoSuccess);
-
-  const SynctoolRun run = syncClient(kClientID);
-  EXPECT_TRUE(run.logged("Can't get a lock on Zeto")) << run.log;
-  EXPECT_EQ(run.finalStatus(), 3);
-  EXPECT_FALSE(fs::exists(volume() / "Contacts"));
-}
-
 using PlayerMatching = SynctoolTest;
 
-TEST_F(PlayerMatching, TheClientIdentifierMustEndWithTheUpperCaseHexIdentifier) {
-  // The file's identifiers are read as numbers: leading zeros and lower case do not matter,
-  // the tool compares the "%llX" text, 1A2B here.
-  setPlayers({Player("00001a2b")});
-  registerClient("XYZ01A2B", false, false);
-  registerClient("XYZ01a2b", false, false);
-  registerClient("1A2BXYZ", false, false);
+TEST_F(PlayerMatching, TheClientIdentifierMustEndWithTheUpperCaseHexIdentifierOfTheFirstMatch) {
+  // The file's identifiers are read as numbers: leading zeros and lower case do not matter, the
+  // tool compares the "%llX" text. "2B" and "1A2B" both end "XYZ01A2B"; the first listed wins.
+  const fs::path other = folder() / "other";
+  fs::create_directories(other);
+  setPlayers({Player("FF"), Player("0002b", other), Player("00001a2b")});
+  for (const char* clientID : {"XYZ01A2B", "XYZ01a2b", "1A2BXYZ"})
+    registerClient(clientID, false, false);
 
   const SynctoolRun match = syncClient("XYZ01A2B");
   EXPECT_EQ(match.finalStatus(), 0) << match.log;
-  EXPECT_TRUE(match.logged("Zeto is connected"));
-  EXPECT_TRUE(client("XYZ01A2B")->lastSession().has_value());
-
+  EXPECT_TRUE(fs::is_directory(other / "Contacts"));
+  EXPECT_FALSE(fs::exists(volume() / "Contacts"));
   for (const char* clientID : {"XYZ01a2b", "1A2BXYZ"}) {
     SCOPED_TRACE(clientID);
     const SynctoolRun miss = syncClient(clientID);
     EXPECT_EQ(miss.finalStatus(), 3);
     EXPECT_TRUE(miss.logged("Can't find Zeto")) << miss.log;
-    EXPECT_FALSE(client(clientID)->lastSession().has_value());
   }
-}
-
-TEST_F(PlayerMatching, TheFirstMatchingPlayerInTheListIsSynced) {
-  const fs::path other = folder() / "other";
-  fs::create_directories(other);
-  // "2B" and "1A2B" both end the client identifier; the one listed first wins.
-  setPlayers({Player("FF"), Player("02B", other), Player("1A2B")});
-  registerClient("XYZ01A2B", false, false);
-  const SynctoolRun run = syncClient("XYZ01A2B");
-  EXPECT_EQ(run.finalStatus(), 0) << run.log;
-  EXPECT_TRUE(fs::is_directory(other / "Contacts"));
-  EXPECT_FALSE(fs::exists(volume() / "Contacts"));
 }
 
 }  // namespace

@@ -14,6 +14,7 @@
 #include <utility>
 #include <vector>
 
+#include "support/process.h"
 #include "support/temporary_folder.h"
 #include "tessel/client.h"
 #include "tessel/store.h"
@@ -23,9 +24,8 @@ namespace zt::sync::test_support {
 namespace fs = std::filesystem;
 using Json = nlohmann::ordered_json;
 
-// One simulated player of the virtual device file.
+// One simulated player of the virtual device file; an empty volume is the test's volume folder.
 struct Player {
-  // A mounted player; an empty volume is the test's volume folder.
   explicit Player(std::string identifier, fs::path volumePath = {})
       : id(std::move(identifier)), volume(std::move(volumePath)) {}
   // A player whose volume mounts that many seconds after the tool registers for events.
@@ -33,11 +33,6 @@ struct Player {
     Player player(std::move(identifier));
     player.mounted = false;
     player.mountAfter = seconds;
-    return player;
-  }
-  static Player neverMounting(std::string identifier) {
-    Player player(std::move(identifier));
-    player.mounted = false;
     return player;
   }
 
@@ -55,59 +50,47 @@ struct SynctoolRun {
   double seconds = 0;   // wall time of the run
   std::string log;      // the whole log file; empty when nothing was logged
   std::vector<std::string> logLines;
-  // When each log line came, in seconds after the start; only for a run watched to be killed.
+  // When each log line came, in seconds after the start; only for a watched run.
   std::vector<double> logLineSeconds;
   std::vector<Json> notifications;  // the notification log, one object per line, in order
-  std::string standardError;        // standard output and standard error together
 
-  // Whether some line of the log is exactly `line`.
-  bool logged(std::string_view line) const;
-  // Whether the log holds `text` anywhere (messages may span lines).
-  bool logContains(std::string_view text) const;
-  // The index of the first line exactly `line`; none when absent.
+  bool logged(std::string_view line) const { return lineIndex(line).has_value(); }
+  bool logContains(std::string_view text) const { return log.find(text) != std::string::npos; }
   std::optional<std::size_t> lineIndex(std::string_view line) const;
   // "TesselClientStatus" of the last notification; none when it has none.
   std::optional<std::int64_t> finalStatus() const;
-  // The data-class list of the first notification that carries one; none without one.
+  // The data-class list of the first notification that carries one.
   std::optional<std::vector<std::string>> dataClassesSyncing() const;
 };
 
 // A notification's line as the tool writes it, its payload keys in the order they are added.
-// A status of none and a class list of none are left out.
 Json expectedNotification(std::string_view sender, std::string_view phase, double percent,
                           std::optional<std::int64_t> status = std::nullopt,
                           std::optional<std::vector<std::string>> dataClasses = std::nullopt);
 
-// Where a run is cut short with SIGKILL: `seconds` after the tool wrote its n-th log line
-// (counting from 1), or after the n-th file event of `fileEvents` (an inotify mask: IN_CREATE,
-// IN_CLOSE_WRITE...) on a file of `folder`, or after the start when neither is given. A
-// watched run (the default) is followed the same way but not killed.
+// A watched run: its log goes through a pipe, so each line is seen (and timed) as it is written.
+// It is cut short with SIGKILL `seconds` after the tool wrote its `logLine`-th line (from 1), or
+// after the `eventCount`-th inotify event of `fileEvents` in `folder`; with neither, never.
 struct KillAt {
-  static KillAt afterLogLine(std::size_t n, double seconds = 0) {
+  static KillAt afterLogLine(std::size_t n, double seconds) {
     KillAt at;
     at.logLine = n;
     at.seconds = seconds;
     return at;
   }
-  static KillAt afterFileEvent(fs::path folder, std::uint32_t fileEvents, std::size_t n = 1) {
+  static KillAt afterFileEvent(fs::path folder, std::uint32_t events, std::size_t n) {
     KillAt at;
     at.folder = std::move(folder);
-    at.fileEvents = fileEvents;
+    at.fileEvents = events;
     at.eventCount = n;
-    at.seconds = 0;
-    return at;
-  }
-  static KillAt afterStart(double seconds) {
-    KillAt at;
-    at.seconds = seconds;
     return at;
   }
 
-  std::optional<std::size_t> logLine;
-  std::optional<fs::path> folder;
+  std::size_t logLine = 0;
+  double seconds = 0;
+  fs::path folder;
   std::uint32_t fileEvents = 0;
   std::size_t eventCount = 1;
-  std::optional<double> seconds;  // none: never killed
 };
 
 // Each test gets a fresh folder holding the engine's store, a volume folder, a virtual device
@@ -122,7 +105,7 @@ class SynctoolTest : public ::testing::Test {
   static constexpr std::string_view kClientID = "000A27001A2B3C4D";
 
   void SetUp() override;
-  void TearDown() override;
+  void TearDown() override { store_.reset(); }
 
   const fs::path& folder() const { return folder_.path(); }
   fs::path volume() const { return folder_ / "vol"; }
@@ -131,46 +114,37 @@ class SynctoolTest : public ::testing::Test {
   // Registers a client for the entities of the chosen data classes.
   std::unique_ptr<tessel::Client> registerClient(std::string_view identifier, bool contacts,
                                                  bool calendars);
-  // The client as the store has it now.
-  std::unique_ptr<tessel::Client> client(std::string_view identifier) const;
+  std::unique_ptr<tessel::Client> client(std::string_view identifier) const {
+    return store_->clientWithIdentifier(identifier);
+  }
 
   void setPlayers(const std::vector<Player>& players);
-  void setDevicesFile(const std::string& json);
-  void setDefaults(const std::string& text);
   void setDebugLog(bool on);
-  // The binary posts on this process's session bus too.
   void useSessionBus() { useSessionBus_ = true; }
-  // Replaces or adds one variable of the binary's environment.
   void setEnvironment(const std::string& name, const std::string& value) {
     overrides_[name] = value;
   }
-
   // The environment the binary runs with; helper processes of a test use it too.
   std::map<std::string, std::string> environment() const;
 
-  // Runs zetosynctool with these arguments (the program name is added) and collects what it
-  // left. The log and notification files are emptied first, so each run is seen alone.
-  SynctoolRun runSynctool(const std::vector<std::string>& arguments);
-  // The same run, killed at that moment if it is still going; the log then goes through a
-  // pipe, so a line is seen as soon as the tool wrote it.
-  SynctoolRun runSynctool(const std::vector<std::string>& arguments, const KillAt& kill);
-  SynctoolRun syncClient(std::string_view clientID) {
-    return runSynctool({"--oneshot", "--sync", std::string(clientID)});
+  // Runs zetosynctool with these arguments and collects what it left; the log and
+  // notification files are emptied first. With `watch`, the run is watched and maybe killed.
+  SynctoolRun runSynctool(const std::vector<std::string>& arguments,
+                          const std::optional<KillAt>& watch = std::nullopt);
+  SynctoolRun syncClient(std::string_view clientID,
+                         const std::optional<KillAt>& watch = std::nullopt) {
+    return runSynctool({"--oneshot", "--sync", std::string(clientID)}, watch);
   }
 
-  // What one run of the `tessel` command gave.
-  struct TesselRun {
-    int exitStatus = -1;
-    std::string output;  // standard output and standard error together
-  };
-  // `tessel --store <the test's store> arguments...`, as the desktop application would run it,
-  // with the binary's environment.
-  TesselRun runTessel(const std::vector<std::string>& arguments);
+  // `tessel --store <the test's store> arguments...` with the binary's environment, as the
+  // desktop application would run it; standard error goes with the output.
+  zt::test_support::ProcessRun runTessel(const std::vector<std::string>& arguments);
+  // The same, and the test fails when it does.
+  void tessel(const std::vector<std::string>& arguments);
+  // `tessel records put` of these typed JSON lines.
+  void putRecords(const std::vector<Json>& lines);
 
  private:
-  SynctoolRun runWatched(const std::vector<std::string>& arguments,
-                         const std::optional<KillAt>& kill);
-
   zt::test_support::TemporaryFolder folder_;
   std::unique_ptr<tessel::Store> store_;
   bool useSessionBus_ = false;
@@ -178,7 +152,7 @@ class SynctoolTest : public ::testing::Test {
 };
 
 // Another process that holds the device library's lock on one player, taken through the
-// library itself with the test's environment, until this object goes.
+// library itself with the given environment, until this object goes.
 class LockHolder {
  public:
   LockHolder(const std::map<std::string, std::string>& environment, std::uint64_t uniqueId);
@@ -186,8 +160,7 @@ class LockHolder {
   LockHolder(const LockHolder&) = delete;
   LockHolder& operator=(const LockHolder&) = delete;
 
-  // The library's answer to the holder's ZetoAquireLock; none when the holder did not get
-  // that far.
+  // The library's answer to the holder's ZetoAquireLock; none when it did not get that far.
   std::optional<std::int32_t> result() const { return result_; }
 
  private:
