@@ -137,9 +137,12 @@ void VCardImport::addFile(const fs::path& file) {
 
 void VCardImport::addText(std::string_view text, const std::string& source) {
   // The whole file is converted before anything is kept, so a fault leaves no part of it.
+  std::vector<Card> cards = readCards(text, source);
   std::vector<ConvertedCard> converted;
-  for (const Card& card : readCards(text, source)) {
+  converted.reserve(cards.size());
+  for (Card& card : cards) {
     converted.push_back(convertCard(card, source));
+    card = Card{};  // its text (photos included) is not needed any more
   }
   for (ConvertedCard& card : converted) {
     if (card.kind == CardKind::Group) {
@@ -248,8 +251,8 @@ VCardImportSummary VCardImport::writeTo(Store& store, SyncDeletes syncDeletes) c
   summary.groups = groupCount();
   summary.files = files_;
   // One transaction: an interrupted import leaves the store as it was.
-  AppliedChanges applied =
-      store.applyChanges(StoreChanges{records, earlier.deletions, std::nullopt});
+  AppliedChanges applied = store.applyChanges(
+      StoreChanges{std::move(records), std::move(earlier.deletions), std::nullopt});
   summary.written = applied.written;
   summary.deleted = applied.deleted;
   return summary;
