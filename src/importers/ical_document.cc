@@ -92,6 +92,18 @@ bool isLineTag(const std::string& name) {
   return zt::platform::upperAscii(name) == kLineName;
 }
 
+// libical reads a property the same way wherever it stands, so a line it refuses inside the
+// file it also refuses alone. Each line is parsed alone only once the whole file showed a
+// fault, to name the first line at fault: most files have none and are parsed once.
+void refuseFirstFaultyLine(const std::vector<ICalContentLine>& lines, const std::string& source) {
+  for (const ICalContentLine& line : lines) {
+    if (line.kind != ICalContentLine::Kind::Property || isLineTag(line.name)) continue;
+    if (std::optional<std::string> complaint = complaintAbout(line.text)) {
+      throw ImportError(source, line.line, line.name + ": " + *complaint);
+    }
+  }
+}
+
 }  // namespace
 
 ICalDocument ICalDocument::parse(std::string_view text, std::string source) {
@@ -113,22 +125,19 @@ ICalDocument ICalDocument::parse(std::string_view text, std::string source) {
         break;
       case ICalContentLine::Kind::Property:
         if (isLineTag(line.name)) break;
-        if (std::optional<std::string> complaint = complaintAbout(line.text)) {
-          throw ImportError(source, line.line, line.name + ": " + *complaint);
-        }
         tagged += taggedLine(line) + "\r\n";
         break;
     }
   }
 
   OwnedComponent root(icalparser_parse_string(tagged.c_str()));
+  icalcomponent* where = nullptr;
+  icalproperty* error = root ? firstError(root.get(), &where) : nullptr;
+  if (!root || error != nullptr) refuseFirstFaultyLine(lines, source);
   if (!root) throw ImportError(source, 1, "libical cannot read this file");
   // Every line passed on its own; whatever libical still finds wrong is reported at the
   // component it concerns.
-  icalcomponent* where = nullptr;
-  if (icalproperty* error = firstError(root.get(), &where)) {
-    throw ImportError(source, lineOf(where), errorText(error));
-  }
+  if (error != nullptr) throw ImportError(source, lineOf(where), errorText(error));
   const icalcomponent_kind kind = icalcomponent_isa(root.get());
   if (kind != ICAL_VCALENDAR_COMPONENT && kind != ICAL_XROOT_COMPONENT) {
     throw ImportError(source, lineOf(root.get()), "no VCALENDAR in this file");

@@ -238,6 +238,12 @@ TEST(ICalImportReading, MalformedInputNamesFileAndLine) {
       {head + "RRULE:FREQ=SOMETIMES\r\n" + tail, 5, "RRULE: Can't parse as RECUR value"},
       {head + "BEGIN:VALARM\r\nACTION:DISPLAY\r\nTRIGGER:-PT15Q\r\nEND:VALARM\r\n" + tail, 7,
        "TRIGGER: Can't parse as DURATION value"},
+      // Of two values libical refuses, the first in the file is named, however deep it is.
+      {head +
+           "BEGIN:VALARM\r\nACTION:DISPLAY\r\nTRIGGER:-PT15Q\r\nEND:VALARM\r\n"
+           "DTSTART:2026011\r\n" +
+           tail,
+       7, "TRIGGER: Can't parse as DURATION value"},
       {head + "just some words\r\n" + tail, 5, "not an iCalendar content line"},
       {head + "END:VCALENDAR\r\n", 5, "END:VCALENDAR where BEGIN:VEVENT of line 3 is still open"},
       {head + "END:VEVENT\r\n", 1, "BEGIN:VCALENDAR is never closed"},
