@@ -338,6 +338,12 @@ int main(int argc, char** argv) {
   if (argc == 5 && std::string_view(argv[1]) == "--memory") {
     return memoryChild(argv[2], argv[3], argv[4]);
   }
+  // The generated files, written to a folder to look at (or to import by hand).
+  if (argc == 3 && std::string_view(argv[1]) == "--write") {
+    std::ofstream(fs::path(argv[2]) / "bench.ics", std::ios::binary) << icsText();
+    std::ofstream(fs::path(argv[2]) / "bench.vcf", std::ios::binary) << vcfText();
+    return 0;
+  }
   benchmark::Initialize(&argc, argv);
   if (benchmark::ReportUnrecognizedArguments(argc, argv)) return 1;
   benchmark::RunSpecifiedBenchmarks();

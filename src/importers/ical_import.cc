@@ -216,7 +216,7 @@ std::vector<ICalCalendar> readICalendarPaths(const std::vector<fs::path>& paths,
     }
     // The same calendar named twice is imported once.
     if (!seen.insert(source.identifier).second) continue;
-    calendars.push_back(readICalCalendar(source));
+    calendars.push_back(readICalCalendar(std::move(source)));
   }
   return calendars;
 }
