@@ -1,6 +1,7 @@
 #include "importers/vcard_import.h"
 
 #include <algorithm>
+#include <exception>
 #include <set>
 #include <system_error>
 #include <unordered_set>
@@ -137,12 +138,24 @@ void VCardImport::addFile(const fs::path& file) {
 
 void VCardImport::addText(std::string_view text, const std::string& source) {
   // The whole file is converted before anything is kept, so a fault leaves no part of it.
-  std::vector<Card> cards = readCards(text, source);
+  // Each card is converted as soon as it is read, so that the cards are not all held at
+  // once. A fault of syntax still comes before a fault of conversion in an earlier card, as
+  // when the whole file was read first: on a fault of conversion, the rest is read through.
   std::vector<ConvertedCard> converted;
-  converted.reserve(cards.size());
-  for (Card& card : cards) {
-    converted.push_back(convertCard(card, source));
-    card = Card{};  // its text (photos included) is not needed any more
+  std::exception_ptr conversionFault;
+  struct Stop {};
+  try {
+    forEachCard(text, source, [&](Card& card) {
+      try {
+        converted.push_back(convertCard(card, source));
+      } catch (...) {
+        conversionFault = std::current_exception();
+        throw Stop{};
+      }
+    });
+  } catch (const Stop&) {
+    forEachCard(text, source, [](Card&) {});
+    std::rethrow_exception(conversionFault);
   }
   for (ConvertedCard& card : converted) {
     if (card.kind == CardKind::Group) {

@@ -334,6 +334,9 @@ TEST(VCardImportMalformed, OtherFaults) {
       {"BEGIN:VCARD\r\nPHOTO:data:image/png;base64\r\nEND:VCARD\r\n", "bad data: URI in PHOTO"},
       {"BEGIN:VCARD\r\nTEL;TYPE=\"home:1\r\nEND:VCARD\r\n",
        "parameter value without its closing quote"},
+      // A fault of syntax anywhere in the file comes before one of a card's values.
+      {"BEGIN:VCARD\r\nPHOTO:data:image/png;base64\r\nEND:VCARD\r\nFN:outside\r\n",
+       "FN outside of a card (BEGIN:VCARD ... END:VCARD)"},
   };
   for (const auto& c : cases) {
     VCardImport import;
