@@ -18,6 +18,7 @@
 #include <sstream>
 #include <string>
 #include <string_view>
+#include <utility>
 #include <vector>
 
 #include "importers/ical_import.h"
@@ -198,7 +199,7 @@ void vcardImport(const fs::path& vcf, const fs::path& store) {
   auto opened = Store::open(store);
   VCardImport import;
   import.addPaths({vcf});
-  import.writeTo(*opened, SyncDeletes::Off);
+  std::move(import).writeTo(*opened, SyncDeletes::Off);
 }
 
 fs::path freshStore(const char* name) {

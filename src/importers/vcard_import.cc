@@ -209,15 +209,19 @@ std::size_t VCardImport::groupCount() const {
 }
 
 std::vector<Record> VCardImport::records() const {
-  const Groups allGroups = groups();
+  return recordsOf(contacts_, groups());
+}
+
+std::vector<Record> VCardImport::recordsOf(std::vector<ConvertedCard> contacts,
+                                           const Groups& allGroups) {
   std::map<std::string, std::vector<std::string>, std::less<>> parents;
   for (const auto& [identifier, group] : allGroups.byIdentifier) {
     for (const std::string& member : group.second) parents[member].push_back(identifier);
   }
 
   std::vector<Record> records;
-  for (const ConvertedCard& contact : contacts_) {
-    Dictionary record = contact.attributes;
+  for (ConvertedCard& contact : contacts) {
+    Dictionary record = std::move(contact.attributes);
     if (auto groupsOfContact = parents.find(contact.identifier); groupsOfContact != parents.end()) {
       record.set(TesselRelationship_Contacts_Contact_ParentGroups,
                  identifierArray(groupsOfContact->second));
@@ -237,7 +241,8 @@ std::vector<Record> VCardImport::records() const {
       if (!identifiers.empty()) record.set(relationship, identifierArray(identifiers));
     }
     records.push_back(Record{contact.identifier, std::move(record)});
-    for (const RelatedRecord& related : contact.related) records.push_back(related.record);
+    for (RelatedRecord& related : contact.related) records.push_back(std::move(related.record));
+    contact = ConvertedCard{};
   }
   for (const auto& [identifier, group] : allGroups.byIdentifier) {
     records.push_back(Record{
@@ -249,20 +254,27 @@ std::vector<Record> VCardImport::records() const {
   return records;
 }
 
-VCardImportSummary VCardImport::writeTo(Store& store, SyncDeletes syncDeletes) const {
-  std::vector<Record> records = this->records();
+VCardImportSummary VCardImport::writeTo(Store& store, SyncDeletes syncDeletes) const& {
+  VCardImport copy = *this;
+  return std::move(copy).writeTo(store, syncDeletes);
+}
+
+VCardImportSummary VCardImport::writeTo(Store& store, SyncDeletes syncDeletes) && {
   std::set<std::string, std::less<>> importedContacts;
   for (const ConvertedCard& contact : contacts_) importedContacts.insert(contact.identifier);
+  VCardImportSummary summary;
+  summary.contacts = contactCount();
+  summary.groups = groupCount();
+  summary.files = files_;
+  std::vector<Record> records = recordsOf(std::move(contacts_), groups());
+  contacts_.clear();
+  contactIndex_.clear();
 
   EarlierImports earlier = earlierImports(store, records, importedContacts, syncDeletes);
   if (syncDeletes == SyncDeletes::Off) {
     keepEarlierMembers(store, earlier.groupMembers, importedContacts, records);
   }
 
-  VCardImportSummary summary;
-  summary.contacts = contactCount();
-  summary.groups = groupCount();
-  summary.files = files_;
   // One transaction: an interrupted import leaves the store as it was.
   AppliedChanges applied = store.applyChanges(
       StoreChanges{std::move(records), std::move(earlier.deletions), std::nullopt});
