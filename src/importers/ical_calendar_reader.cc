@@ -93,13 +93,14 @@ struct Related {
 
 class CalendarBuilder {
  public:
-  explicit CalendarBuilder(const ICalCalendarSource& source) : source_(source) {}
+  explicit CalendarBuilder(ICalCalendarSource& source) : source_(source) {}
 
   ICalCalendar build() {
     std::vector<ICalDocument> documents;
     documents.reserve(source_.files.size());
-    for (const ICalFile& file : source_.files) {
+    for (ICalFile& file : source_.files) {
       documents.push_back(ICalDocument::parse(file.text, file.name));
+      std::string().swap(file.text);  // libical holds what is needed of it
     }
 
     ICalCalendar calendar;
@@ -122,6 +123,10 @@ class CalendarBuilder {
     for (Item& item : items_) {
       (item.kind == ItemKind::Event ? events : tasks).push_back(item.identifier);
       append(item, calendar.records);
+      // What libical read of the component is not needed once it became records.
+      icalcomponent_remove_component(icalcomponent_get_parent(item.component), item.component);
+      icalcomponent_free(item.component);
+      item.component = nullptr;
     }
     calendar.eventCount = events.size();
     calendar.taskCount = tasks.size();
@@ -313,14 +318,14 @@ class CalendarBuilder {
     }
   }
 
-  const ICalCalendarSource& source_;
+  ICalCalendarSource& source_;
   std::vector<Item> items_;
   std::map<std::string, std::size_t> positions_;
 };
 
 }  // namespace
 
-ICalCalendar readICalCalendar(const ICalCalendarSource& source) {
+ICalCalendar readICalCalendar(ICalCalendarSource source) {
   return CalendarBuilder(source).build();
 }
 

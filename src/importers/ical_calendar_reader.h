@@ -42,7 +42,8 @@ struct ICalCalendar {
 // schema. Identifiers come from the calendar's identifier and each component's UID (and
 // RECURRENCE-ID), so that reading the same source again gives the same identifiers. Raises
 // ImportError naming the file and line of the first fault: text libical refuses, a date that
-// does not exist, a TZID that nothing defines.
-ICalCalendar readICalCalendar(const ICalCalendarSource& source);
+// does not exist, a TZID that nothing defines. The source is taken by value so that the text
+// of each file is released once libical has read it.
+ICalCalendar readICalCalendar(ICalCalendarSource source);
 
 }  // namespace tessel::importers

@@ -41,6 +41,14 @@ std::optional<std::size_t> valueStart(std::string_view line, std::size_t nameEnd
 
 std::vector<ICalContentLine> readICalContentLines(std::string_view text,
                                                   const std::string& source) {
+  std::vector<ICalContentLine> lines;
+  forEachICalContentLine(text, source,
+                         [&](ICalContentLine& line) { lines.push_back(std::move(line)); });
+  return lines;
+}
+
+void forEachICalContentLine(std::string_view text, const std::string& source,
+                            const std::function<void(ICalContentLine&)>& visit) {
   const auto fail = [&](std::size_t line, std::string reason) -> ImportError {
     return ImportError(source, line, std::move(reason));
   };
@@ -48,98 +56,104 @@ std::vector<ICalContentLine> readICalContentLines(std::string_view text,
   // A byte order mark is not part of the text (some Windows programs write one).
   if (text.substr(0, 3) == "\xEF\xBB\xBF") text.remove_prefix(3);
 
-  const std::vector<PhysicalLine> physical = physicalLines(text);
-
-  // Unfold: a line that starts with a space or a tab continues the one before, without that
-  // first character.
-  struct Logical {
-    std::size_t number;
-    std::string text;
-  };
-  std::vector<Logical> logical;
-  for (const PhysicalLine& line : physical) {
-    if (!line.text.empty() && (line.text.front() == ' ' || line.text.front() == '\t')) {
-      if (logical.empty()) throw fail(line.number, "a folded line continues nothing");
-      logical.back().text.append(line.text.substr(1));
-      continue;
-    }
-    logical.push_back({line.number, std::string(line.text)});
-  }
-
   struct Open {
     std::string name;
     std::size_t line;
   };
   std::vector<Open> open;
-  std::vector<ICalContentLine> lines;
   bool sawCalendar = false;
-  for (Logical& line : logical) {
-    const std::string_view content = line.text;
+  std::optional<std::size_t> firstLine;
+  ICalContentLine out;
+
+  // One line after unfolding, `number` being the line of the file on which it starts.
+  const auto logical = [&](std::size_t number, std::string& unfolded) {
+    if (!firstLine) firstLine = number;
+    const std::string_view content = unfolded;
     // RFC 5545 section 3.1.4: the text is UTF-8. It is checked after unfolding, because
     // section 3.1 lets a fold fall inside a multi-octet character.
     for (std::size_t i = 0; i < content.size();) {
-      if (content[i] == '\0') throw fail(line.number, "a NUL byte is not iCalendar text");
+      if (content[i] == '\0') throw fail(number, "a NUL byte is not iCalendar text");
       const std::size_t length = zt::platform::utf8::sequenceLength(content, i);
-      if (length == 0) throw fail(line.number, "the text is not UTF-8");
+      if (length == 0) throw fail(number, "the text is not UTF-8");
       i += length;
     }
-    if (trimBlanks(content).empty()) continue;
+    if (trimBlanks(content).empty()) return;
     std::size_t nameEnd = 0;
     while (nameEnd < content.size() && isNameCharacter(content[nameEnd])) ++nameEnd;
     if (nameEnd == 0 || nameEnd == content.size() ||
         (content[nameEnd] != ':' && content[nameEnd] != ';')) {
-      throw fail(line.number, "not an iCalendar content line (NAME:value)");
+      throw fail(number, "not an iCalendar content line (NAME:value)");
     }
     const std::optional<std::size_t> value = valueStart(content, nameEnd);
-    if (!value) throw fail(line.number, "no ':' before the value");
+    if (!value) throw fail(number, "no ':' before the value");
     const std::string name = upperAscii(content.substr(0, nameEnd));
 
     if (name == "BEGIN" || name == "END") {
       const std::string component = upperAscii(trimBlanks(content.substr(*value)));
-      if (component.empty()) throw fail(line.number, name + " names no component");
+      if (component.empty()) throw fail(number, name + " names no component");
       if (name == "BEGIN") {
         if (open.empty() && component != "VCALENDAR") {
-          throw fail(line.number, "BEGIN:" + component + " outside BEGIN:VCALENDAR");
+          throw fail(number, "BEGIN:" + component + " outside BEGIN:VCALENDAR");
         }
         if (!open.empty() && component == "VCALENDAR") {
-          throw fail(line.number, "BEGIN:VCALENDAR inside BEGIN:" + open.back().name);
+          throw fail(number, "BEGIN:VCALENDAR inside BEGIN:" + open.back().name);
         }
-        if (open.size() == kMaximumDepth) throw fail(line.number, "components nest too deeply");
+        if (open.size() == kMaximumDepth) throw fail(number, "components nest too deeply");
         sawCalendar = true;
-        open.push_back({component, line.number});
-        lines.push_back({ICalContentLine::Kind::Begin, line.number, component, {}});
+        open.push_back({component, number});
+        out.kind = ICalContentLine::Kind::Begin;
       } else {
-        if (open.empty()) throw fail(line.number, "END:" + component + " without its BEGIN");
+        if (open.empty()) throw fail(number, "END:" + component + " without its BEGIN");
         if (open.back().name != component) {
-          throw fail(line.number, "END:" + component + " where BEGIN:" + open.back().name +
-                                      " of line " + std::to_string(open.back().line) +
-                                      " is still open");
+          throw fail(number, "END:" + component + " where BEGIN:" + open.back().name + " of line " +
+                                 std::to_string(open.back().line) + " is still open");
         }
         open.pop_back();
-        lines.push_back({ICalContentLine::Kind::End, line.number, component, {}});
+        out.kind = ICalContentLine::Kind::End;
       }
-      continue;
+      out.line = number;
+      out.name = component;
+      out.text.clear();
+      visit(out);
+      return;
     }
 
-    if (open.empty()) throw fail(line.number, name + " outside BEGIN:VCALENDAR");
+    if (open.empty()) throw fail(number, name + " outside BEGIN:VCALENDAR");
     // Diagnostics that libical wrote into a file it exported once are not data.
-    if (name == "X-LIC-ERROR") continue;
+    if (name == "X-LIC-ERROR") return;
     // Exporters write empty values ("DESCRIPTION:") for fields the user left blank; they
     // say nothing, and libical would refuse them.
-    if (trimBlanks(content.substr(*value)).empty()) continue;
-    std::string written(content.substr(0, nameEnd));
-    lines.push_back(
-        {ICalContentLine::Kind::Property, line.number, std::move(written), std::move(line.text)});
-  }
+    if (trimBlanks(content.substr(*value)).empty()) return;
+    out.kind = ICalContentLine::Kind::Property;
+    out.line = number;
+    out.name.assign(content.substr(0, nameEnd));
+    out.text.swap(unfolded);
+    visit(out);
+  };
+
+  // Unfold: a line that starts with a space or a tab continues the one before, without that
+  // first character.
+  std::string unfolded;
+  std::optional<std::size_t> unfoldedLine;
+  forEachPhysicalLine(text, [&](const PhysicalLine& line) {
+    if (!line.text.empty() && (line.text.front() == ' ' || line.text.front() == '\t')) {
+      if (!unfoldedLine) throw fail(line.number, "a folded line continues nothing");
+      unfolded.append(line.text.substr(1));
+      return;
+    }
+    if (unfoldedLine) logical(*unfoldedLine, unfolded);
+    unfoldedLine = line.number;
+    unfolded.assign(line.text);
+  });
+  if (unfoldedLine) logical(*unfoldedLine, unfolded);
+
   if (!open.empty()) {
     throw fail(open.back().line,
                "BEGIN:" + open.back().name + " is never closed by END:" + open.back().name);
   }
   if (!sawCalendar) {
-    throw fail(logical.empty() ? 1 : logical.front().number,
-               "no BEGIN:VCALENDAR: this is not an iCalendar file");
+    throw fail(firstLine ? *firstLine : 1, "no BEGIN:VCALENDAR: this is not an iCalendar file");
   }
-  return lines;
 }
 
 }  // namespace tessel::importers

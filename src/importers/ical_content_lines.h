@@ -1,6 +1,7 @@
 #pragma once
 
 #include <cstddef>
+#include <functional>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -27,5 +28,11 @@ struct ICalContentLine {
 // empty value, libical's own X-LIC-ERROR remarks) are left out. Raises ImportError naming
 // `source` and the line of the first fault.
 std::vector<ICalContentLine> readICalContentLines(std::string_view text, const std::string& source);
+
+// The same content lines, handed to `visit` one by one as they are read, so that no copy of
+// the whole text is held. The faults are the same, raised when the reading reaches them:
+// `visit` has then seen the lines before the fault.
+void forEachICalContentLine(std::string_view text, const std::string& source,
+                            const std::function<void(ICalContentLine&)>& visit);
 
 }  // namespace tessel::importers

@@ -92,43 +92,92 @@ bool isLineTag(const std::string& name) {
   return zt::platform::upperAscii(name) == kLineName;
 }
 
+// libical's parser fed one unfolded line at a time, gathering what it completes as
+// icalparser_parse_string does: one VCALENDAR, or several under an XROOT component.
+class LineParser {
+ public:
+  LineParser()
+      : parser_(icalparser_new()), malformed_(icalerror_get_error_state(ICAL_MALFORMEDDATA_ERROR)) {
+    icalerror_set_error_state(ICAL_MALFORMEDDATA_ERROR, ICAL_ERROR_NONFATAL);
+  }
+  ~LineParser() {
+    icalerror_set_error_state(ICAL_MALFORMEDDATA_ERROR, malformed_);
+    icalparser_free(parser_);
+  }
+  LineParser(const LineParser&) = delete;
+  LineParser& operator=(const LineParser&) = delete;
+
+  void add(std::string& line) {
+    OwnedComponent done(icalparser_add_line(parser_, line.data()));
+    if (!done) return;
+    if (!root_) {
+      root_ = std::move(done);
+    } else {
+      if (icalcomponent_isa(root_.get()) != ICAL_XROOT_COMPONENT) {
+        OwnedComponent xroot(icalcomponent_new(ICAL_XROOT_COMPONENT));
+        icalcomponent_add_component(xroot.get(), root_.release());
+        root_ = std::move(xroot);
+      }
+      icalcomponent_add_component(root_.get(), done.release());
+    }
+  }
+  void add(std::string&& line) { add(line); }
+
+  OwnedComponent root() { return std::move(root_); }
+
+ private:
+  icalparser* parser_;
+  icalerrorstate malformed_;
+  OwnedComponent root_;
+};
+
+// libical reads a property the same way wherever it stands, so a line it refuses inside the
+// file it also refuses alone. Each line is parsed alone only once the whole file showed a
+// fault, to name the first line at fault: most files have none and are parsed once.
+void refuseFirstFaultyLine(const std::vector<ICalContentLine>& lines, const std::string& source) {
+  for (const ICalContentLine& line : lines) {
+    if (line.kind != ICalContentLine::Kind::Property || isLineTag(line.name)) continue;
+    if (std::optional<std::string> complaint = complaintAbout(line.text)) {
+      throw ImportError(source, line.line, line.name + ": " + *complaint);
+    }
+  }
+}
+
 }  // namespace
 
 ICalDocument ICalDocument::parse(std::string_view text, std::string source) {
   // A libical built with ICAL_ERRORS_ARE_FATAL aborts on the first value it cannot read;
   // here such a value is a fault to report with its line.
   icalerror_set_errors_are_fatal(0);
-  const std::vector<ICalContentLine> lines = readICalContentLines(text, source);
-
+  LineParser parser;
+  // The lines go to libical as they are read, each checked one, so that neither the
+  // unfolded text nor its lines are held beside libical's components.
   std::string tagged;
-  tagged.reserve(text.size() + lines.size() * 32);
-  for (const ICalContentLine& line : lines) {
+  forEachICalContentLine(text, source, [&](const ICalContentLine& line) {
     switch (line.kind) {
       case ICalContentLine::Kind::Begin:
-        tagged += "BEGIN:" + line.name + "\r\n";
-        tagged += std::string(kLineName) + ':' + std::to_string(line.line) + "\r\n";
+        parser.add("BEGIN:" + line.name);
+        parser.add(std::string(kLineName) + ':' + std::to_string(line.line));
         break;
       case ICalContentLine::Kind::End:
-        tagged += "END:" + line.name + "\r\n";
+        parser.add("END:" + line.name);
         break;
       case ICalContentLine::Kind::Property:
         if (isLineTag(line.name)) break;
-        if (std::optional<std::string> complaint = complaintAbout(line.text)) {
-          throw ImportError(source, line.line, line.name + ": " + *complaint);
-        }
-        tagged += taggedLine(line) + "\r\n";
+        tagged = taggedLine(line);
+        parser.add(tagged);
         break;
     }
-  }
+  });
 
-  OwnedComponent root(icalparser_parse_string(tagged.c_str()));
+  OwnedComponent root = parser.root();
+  icalcomponent* where = nullptr;
+  icalproperty* error = root ? firstError(root.get(), &where) : nullptr;
+  if (!root || error != nullptr) refuseFirstFaultyLine(readICalContentLines(text, source), source);
   if (!root) throw ImportError(source, 1, "libical cannot read this file");
   // Every line passed on its own; whatever libical still finds wrong is reported at the
   // component it concerns.
-  icalcomponent* where = nullptr;
-  if (icalproperty* error = firstError(root.get(), &where)) {
-    throw ImportError(source, lineOf(where), errorText(error));
-  }
+  if (error != nullptr) throw ImportError(source, lineOf(where), errorText(error));
   const icalcomponent_kind kind = icalcomponent_isa(root.get());
   if (kind != ICAL_VCALENDAR_COMPONENT && kind != ICAL_XROOT_COMPONENT) {
     throw ImportError(source, lineOf(root.get()), "no VCALENDAR in this file");

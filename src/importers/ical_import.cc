@@ -119,12 +119,13 @@ StoredCalendars storedCalendars(const Store& store, const std::vector<ICalCalend
 
 // Adds to `records` what one calendar puts, and to `stale` what it deletes of the records the
 // store held of it (`before`).
-void mergeCalendar(const ICalCalendar& calendar, const RecordMap& before, SyncDeletes syncDeletes,
+// The calendar's records are moved into `records`.
+void mergeCalendar(ICalCalendar& calendar, const RecordMap& before, SyncDeletes syncDeletes,
                    std::vector<Record>& records, std::vector<std::string>& stale) {
   std::set<std::string> produced;
   for (const Record& record : calendar.records) produced.insert(record.id);
 
-  std::vector<Record> written = calendar.records;
+  std::vector<Record>& written = calendar.records;
   std::set<std::string> kept;
   if (syncDeletes == SyncDeletes::Off) {
     // Events and tasks that left the source stay, listed in their calendar as before, and
@@ -155,6 +156,8 @@ void mergeCalendar(const ICalCalendar& calendar, const RecordMap& before, SyncDe
     if (produced.count(id) == 0 && kept.count(id) == 0) stale.push_back(id);
   }
   for (Record& record : written) records.push_back(std::move(record));
+  written.clear();
+  written.shrink_to_fit();
 }
 
 // The order keeps the calendars it lists that still exist, then the new ones.
@@ -203,24 +206,33 @@ std::vector<ICalCalendar> readICalendarPaths(const std::vector<fs::path>& paths,
     }
     // The same calendar named twice is imported once.
     if (!seen.insert(source.identifier).second) continue;
-    calendars.push_back(readICalCalendar(source));
+    calendars.push_back(readICalCalendar(std::move(source)));
   }
   return calendars;
 }
 
 ICalImportCounts writeICalCalendars(Store& store, const std::vector<ICalCalendar>& calendars,
                                     SyncDeletes syncDeletes) {
+  std::vector<ICalCalendar> copies = calendars;
+  return writeICalCalendars(store, copies, syncDeletes);
+}
+
+ICalImportCounts writeICalCalendars(Store& store, std::vector<ICalCalendar>& calendars,
+                                    SyncDeletes syncDeletes) {
   StoredCalendars stored = storedCalendars(store, calendars);
-  std::vector<Record> records;
-  std::vector<std::string> stale;
-  for (const ICalCalendar& calendar : calendars) {
-    mergeCalendar(calendar, stored.records[calendar.identifier], syncDeletes, records, stale);
+  StoreChanges changes;
+  std::size_t count = 0;
+  for (const ICalCalendar& calendar : calendars) count += calendar.records.size();
+  changes.put.reserve(count);
+  for (ICalCalendar& calendar : calendars) {
+    mergeCalendar(calendar, stored.records[calendar.identifier], syncDeletes, changes.put,
+                  changes.remove);
   }
   for (const ICalCalendar& calendar : calendars) stored.live.insert(calendar.identifier);
-  const std::vector<std::string> order = calendarOrder(stored.order, stored.live, calendars);
+  changes.calendarOrder = calendarOrder(stored.order, stored.live, calendars);
 
   // One transaction: an interrupted import leaves the store as it was.
-  AppliedChanges applied = store.applyChanges(StoreChanges{records, stale, order});
+  AppliedChanges applied = store.applyChanges(changes);
   ICalImportCounts counts;
   counts.written = applied.written;
   counts.deleted = applied.deleted;

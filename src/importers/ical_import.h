@@ -40,6 +40,11 @@ struct ICalImportCounts {
 // produces are deleted with SyncDeletes::On; with Off, events and tasks that left the
 // source stay in their calendar, and only the related records (alarms, attendees, ...) that
 // their re-imported events no longer list are deleted.
+// This one moves the records out of `calendars` into the store's transaction, so that they
+// are not held twice; the identifiers, titles and counts stay, for the report.
+ICalImportCounts writeICalCalendars(Store& store, std::vector<ICalCalendar>& calendars,
+                                    SyncDeletes syncDeletes);
+// This one writes copies of the records.
 ICalImportCounts writeICalCalendars(Store& store, const std::vector<ICalCalendar>& calendars,
                                     SyncDeletes syncDeletes);
 

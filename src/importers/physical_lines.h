@@ -18,4 +18,18 @@ struct PhysicalLine {
 // end a line here, so that no CR is left inside a line.
 std::vector<PhysicalLine> physicalLines(std::string_view text);
 
+// The same lines, handed to `visit` one by one instead of held together.
+template <typename Visit>
+void forEachPhysicalLine(std::string_view text, Visit&& visit) {
+  std::size_t number = 1;
+  std::size_t start = 0;
+  for (std::size_t i = 0; i < text.size(); ++i) {
+    if (text[i] != '\r' && text[i] != '\n') continue;
+    visit(PhysicalLine{number++, text.substr(start, i - start)});
+    if (text[i] == '\r' && i + 1 < text.size() && text[i + 1] == '\n') ++i;
+    start = i + 1;
+  }
+  if (start < text.size()) visit(PhysicalLine{number, text.substr(start)});
+}
+
 }  // namespace tessel::importers

@@ -1,6 +1,7 @@
 #include "importers/vcard_import.h"
 
 #include <algorithm>
+#include <exception>
 #include <set>
 #include <system_error>
 #include <unordered_set>
@@ -128,9 +129,24 @@ void VCardImport::addFile(const fs::path& file) {
 
 void VCardImport::addText(std::string_view text, const std::string& source) {
   // The whole file is converted before anything is kept, so a fault leaves no part of it.
+  // Each card is converted as soon as it is read, so that the cards are not all held at
+  // once. A fault of syntax still comes before a fault of conversion in an earlier card, as
+  // when the whole file was read first: on a fault of conversion, the rest is read through.
   std::vector<ConvertedCard> converted;
-  for (const Card& card : readCards(text, source)) {
-    converted.push_back(convertCard(card, source));
+  std::exception_ptr conversionFault;
+  struct Stop {};
+  try {
+    forEachCard(text, source, [&](Card& card) {
+      try {
+        converted.push_back(convertCard(card, source));
+      } catch (...) {
+        conversionFault = std::current_exception();
+        throw Stop{};
+      }
+    });
+  } catch (const Stop&) {
+    forEachCard(text, source, [](Card&) {});
+    std::rethrow_exception(conversionFault);
   }
   for (ConvertedCard& card : converted) {
     if (card.kind == CardKind::Group) {
@@ -184,15 +200,19 @@ std::size_t VCardImport::groupCount() const {
 }
 
 std::vector<Record> VCardImport::records() const {
-  const Groups allGroups = groups();
+  return recordsOf(contacts_, groups());
+}
+
+std::vector<Record> VCardImport::recordsOf(std::vector<ConvertedCard> contacts,
+                                           const Groups& allGroups) {
   std::map<std::string, std::vector<std::string>, std::less<>> parents;
   for (const auto& [identifier, group] : allGroups.byIdentifier) {
     for (const std::string& member : group.second) parents[member].push_back(identifier);
   }
 
   std::vector<Record> records;
-  for (const ConvertedCard& contact : contacts_) {
-    Dictionary record = contact.attributes;
+  for (ConvertedCard& contact : contacts) {
+    Dictionary record = std::move(contact.attributes);
     if (auto groupsOfContact = parents.find(contact.identifier); groupsOfContact != parents.end()) {
       record.set(TesselRelationship_Contacts_Contact_ParentGroups,
                  identifierArray(groupsOfContact->second));
@@ -212,7 +232,8 @@ std::vector<Record> VCardImport::records() const {
       if (!identifiers.empty()) record.set(relationship, identifierArray(identifiers));
     }
     records.push_back(Record{contact.identifier, std::move(record)});
-    for (const RelatedRecord& related : contact.related) records.push_back(related.record);
+    for (RelatedRecord& related : contact.related) records.push_back(std::move(related.record));
+    contact = ConvertedCard{};
   }
   for (const auto& [identifier, group] : allGroups.byIdentifier) {
     records.push_back(Record{
@@ -224,23 +245,30 @@ std::vector<Record> VCardImport::records() const {
   return records;
 }
 
-VCardImportSummary VCardImport::writeTo(Store& store, SyncDeletes syncDeletes) const {
-  std::vector<Record> records = this->records();
+VCardImportSummary VCardImport::writeTo(Store& store, SyncDeletes syncDeletes) const& {
+  VCardImport copy = *this;
+  return std::move(copy).writeTo(store, syncDeletes);
+}
+
+VCardImportSummary VCardImport::writeTo(Store& store, SyncDeletes syncDeletes) && {
   std::set<std::string, std::less<>> importedContacts;
   for (const ConvertedCard& contact : contacts_) importedContacts.insert(contact.identifier);
+  VCardImportSummary summary;
+  summary.contacts = contactCount();
+  summary.groups = groupCount();
+  summary.files = files_;
+  std::vector<Record> records = recordsOf(std::move(contacts_), groups());
+  contacts_.clear();
+  contactIndex_.clear();
 
   EarlierImports earlier = earlierImports(store, records, importedContacts, syncDeletes);
   if (syncDeletes == SyncDeletes::Off) {
     keepEarlierMembers(store, earlier.groupMembers, importedContacts, records);
   }
 
-  VCardImportSummary summary;
-  summary.contacts = contactCount();
-  summary.groups = groupCount();
-  summary.files = files_;
   // One transaction: an interrupted import leaves the store as it was.
-  AppliedChanges applied =
-      store.applyChanges(StoreChanges{records, earlier.deletions, std::nullopt});
+  AppliedChanges applied = store.applyChanges(
+      StoreChanges{std::move(records), std::move(earlier.deletions), std::nullopt});
   summary.written = applied.written;
   summary.deleted = applied.deleted;
   return summary;

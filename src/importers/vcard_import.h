@@ -56,7 +56,10 @@ class VCardImport {
   // imported contacts no longer have and, with SyncDeletes::On, every other record of an
   // earlier vCard import that this one does not produce. Without SyncDeletes::On, a group
   // keeps the members that earlier imports gave it and that this import did not read again.
-  VCardImportSummary writeTo(Store& store, SyncDeletes syncDeletes) const;
+  VCardImportSummary writeTo(Store& store, SyncDeletes syncDeletes) const&;
+  // The same, moving the records into the store's transaction instead of copying them, so
+  // that an import of many cards does not hold them twice: std::move(import).writeTo(...).
+  VCardImportSummary writeTo(Store& store, SyncDeletes syncDeletes) &&;
 
  private:
   struct Groups {
@@ -64,6 +67,8 @@ class VCardImport {
     std::map<std::string, std::pair<std::string, std::vector<std::string>>> byIdentifier;
   };
   Groups groups() const;
+  // records() of `contacts`, whose attributes and related records are moved into them.
+  static std::vector<Record> recordsOf(std::vector<ConvertedCard> contacts, const Groups& groups);
 
   std::vector<ConvertedCard> contacts_;
   std::map<std::string, std::size_t, std::less<>> contactIndex_;

@@ -153,9 +153,15 @@ bool ContentLine::hasType(std::string_view lowerCaseType) const {
 }
 
 std::vector<Card> readCards(std::string_view input, const std::string& source) {
+  std::vector<Card> cards;
+  forEachCard(input, source, [&](Card& card) { cards.push_back(std::move(card)); });
+  return cards;
+}
+
+void forEachCard(std::string_view input, const std::string& source,
+                 const std::function<void(Card&)>& visit) {
   const std::string text = decodeWholeText(input, source);
   const std::vector<PhysicalLine> lines = physicalLines(text);
-  std::vector<Card> cards;
   Card card;
   // Depth of BEGIN:VCARD; cards nested in a vCard 2.1 AGENT property are skipped.
   int depth = 0;
@@ -195,7 +201,10 @@ std::vector<Card> readCards(std::string_view input, const std::string& source) {
     }
     if (content.name == "END" && isVCardMarker) {
       if (depth == 0) throw ImportError(source, first.number, "END:VCARD without BEGIN:VCARD");
-      if (--depth == 0) cards.push_back(std::move(card));
+      if (--depth == 0) {
+        visit(card);
+        card = Card{};
+      }
       continue;
     }
     if (depth == 0) {
@@ -212,7 +221,6 @@ std::vector<Card> readCards(std::string_view input, const std::string& source) {
   if (depth > 0) {
     throw ImportError(source, card.line, "card has no END:VCARD");
   }
-  return cards;
 }
 
 }  // namespace tessel::importers

@@ -4,6 +4,7 @@
 // cards of content lines, with folded lines joined and parameters split, values still raw.
 
 #include <cstddef>
+#include <functional>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -42,5 +43,11 @@ struct Card {
 // opens the text or is absent. Faults raise ImportError naming `source` and the line: a line
 // without a colon, a property outside a card, a card without END:VCARD.
 std::vector<Card> readCards(std::string_view text, const std::string& source);
+
+// The same cards, handed to `visit` one by one as each ends, so that they are not all held
+// at once. The faults are the same, raised when the reading reaches them: `visit` has then
+// seen the cards before the fault.
+void forEachCard(std::string_view text, const std::string& source,
+                 const std::function<void(Card&)>& visit);
 
 }  // namespace tessel::importers

@@ -9,7 +9,7 @@ namespace tessel::cli {
 
 void importICalendars(CommandContext& context, const std::vector<std::string>& paths,
                       const std::optional<std::string>& title, importers::SyncDeletes syncDeletes) {
-  const std::vector<importers::ICalCalendar> calendars = importers::readICalendarPaths(
+  std::vector<importers::ICalCalendar> calendars = importers::readICalendarPaths(
       std::vector<std::filesystem::path>(paths.begin(), paths.end()), title);
   const importers::ICalImportCounts counts =
       importers::writeICalCalendars(context.store(), calendars, syncDeletes);
