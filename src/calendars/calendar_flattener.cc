@@ -181,7 +181,7 @@ bool isEvent(const Dictionary& record) {
 }
 
 // The related records of all of a calendar's events, fetched in one request and handed out
-// to the events that name them. A record named by one event only is moved out.
+// to the events that name them. A record named by one event only is moved out and released.
 class SubRecords {
  public:
   SubRecords(const tessel::Snapshot& snapshot, const tessel::RecordMap& entities) {
@@ -223,7 +223,9 @@ class SubRecords {
       if (std::binary_search(shared_.begin(), shared_.end(), id)) {
         copyKeys(found->second, subRecord, keys);
       } else {
+        // Named by this event alone: taken, and the rest of the record released at once.
         takeKeys(found->second, subRecord, keys);
+        records_.erase(found);
       }
       flattened.emplace_back(std::move(subRecord));
     }
@@ -255,7 +257,6 @@ bool flattenEntity(Record& record, Array* eventArray, Array* taskArray,
 
   if (*entity == TesselEntity_Calendars_Event) {
     Dictionary event;
-    event.reserve(kEventFilteredKeys.size() + subEntities().size());
     takeKeys(record, event, kEventFilteredKeys);
     for (const SubEntity& sub : subEntities()) {
       const Value* relationship = record.find(sub.relationship);
