@@ -51,6 +51,18 @@ TEST(FoldingTest, StringFoldCopiesBufferFoldWorksInPlace) {
   EXPECT_EQ(buffer, std::string(72, 'x') + "\r\n x");
 }
 
+TEST(FoldingTest, FoldingTheEndOfABufferInPlaceGivesTheFoldOfACopy) {
+  for (const std::string unit : {"a", "\xC3\xA9", "\xF0\x9F\x98\x80"}) {
+    for (std::size_t length = 0; length <= 220; ++length) {
+      std::string text(length, 'x');
+      if (length > 0) text.replace(length / 2, 1, unit);
+      std::string buffer = "PREFIX:" + text;
+      foldRFC2445From(buffer, 7);
+      EXPECT_EQ(buffer, "PREFIX:" + fold(std::string_view(text))) << length << " " << unit;
+    }
+  }
+}
+
 TEST(EscapingTest, ValueEscapingFollowsTheReplacementOrder) {
   EXPECT_EQ(iCalendarEscapeValue("a;b,c\\d"), "a\\;b\\,c\\\\d");
   EXPECT_EQ(iCalendarEscapeValue("x\ry\nz"), "x\\ny\\nz");
