@@ -1,6 +1,8 @@
 #include "calendars/calendar_flattener.h"
 
+#include <algorithm>
 #include <array>
+#include <cstddef>
 #include <utility>
 #include <vector>
 
@@ -137,9 +139,170 @@ void copyKeys(const Dictionary& source, Dictionary& destination, KeyList keys) {
   }
 }
 
+// As copyKeys, moving the values out of a record that is read no further, except the
+// original date, which the detached-occurrence lookup still reads. A key listed twice was
+// taken at its first listing, which copying would have written again unchanged.
+void takeKeys(Dictionary& source, Dictionary& destination, KeyList keys) {
+  for (std::size_t i = 0; i < keys.size(); ++i) {
+    const std::string_view key = keys[i];
+    Value* value = source.find(key);
+    if (!value) continue;
+    if (std::find(keys.begin(), keys.begin() + static_cast<std::ptrdiff_t>(i), key) !=
+        keys.begin() + static_cast<std::ptrdiff_t>(i)) {
+      continue;
+    }
+    if (key == TesselAttribute_Calendars_Event_OriginalDate) {
+      destination.set(key, *value);
+    } else {
+      destination.set(key, std::move(*value));
+    }
+  }
+}
+void takeKeys(const Dictionary& source, Dictionary& destination, KeyList keys) {
+  copyKeys(source, destination, keys);
+}
+
+// The identifiers of one relationship as a fetch of them yields their records: in
+// identifier order (tessel::RecordMap is a std::map), each once.
+std::vector<std::string_view> fetchOrder(const Array& identifiers) {
+  std::vector<std::string_view> ids;
+  ids.reserve(identifiers.size());
+  for (const Value& element : identifiers) {
+    if (const std::string* text = element.asString()) ids.emplace_back(*text);
+  }
+  std::sort(ids.begin(), ids.end());
+  ids.erase(std::unique(ids.begin(), ids.end()), ids.end());
+  return ids;
+}
+
+bool isEvent(const Dictionary& record) {
+  const std::string* entity = record.stringAt(TesselRecordEntityNameKey);
+  return entity && *entity == TesselEntity_Calendars_Event;
+}
+
+// The related records of all of a calendar's events, fetched in one request and handed out
+// to the events that name them. A record named by one event only is moved out and released.
+class SubRecords {
+ public:
+  SubRecords(const tessel::Snapshot& snapshot, const tessel::RecordMap& entities) {
+    std::vector<std::string_view> all;
+    for (const auto& [identifier, record] : entities) {
+      if (!isEvent(record)) continue;
+      for (const SubEntity& sub : subEntities()) {
+        const Value* relationship = record.find(sub.relationship);
+        const Array* identifiers = relationship ? relationship->asArray() : nullptr;
+        if (!identifiers || identifiers->empty()) continue;
+        std::vector<std::string_view> ids = fetchOrder(*identifiers);
+        all.insert(all.end(), ids.begin(), ids.end());
+      }
+    }
+    if (all.empty()) return;
+    std::sort(all.begin(), all.end());
+    std::vector<std::string> unique;
+    unique.reserve(all.size());
+    for (std::size_t i = 0; i < all.size(); ++i) {
+      if (i > 0 && all[i] == all[i - 1]) {
+        if (shared_.empty() || shared_.back() != all[i]) shared_.emplace_back(all[i]);
+        continue;
+      }
+      unique.emplace_back(all[i]);
+    }
+    records_ = snapshot.recordsWithIdentifiers(unique);
+  }
+
+  // What CalendarFlattener::appendCalSubEntities stores for these identifiers.
+  void append(const Array& identifiers, KeyList keys, std::string_view icalKey, Dictionary& event) {
+    if (identifiers.empty()) return;
+    const std::vector<std::string_view> ids = fetchOrder(identifiers);
+    Array flattened;
+    flattened.reserve(ids.size());
+    for (std::string_view id : ids) {
+      auto found = records_.find(id);
+      if (found == records_.end()) continue;
+      Dictionary subRecord;
+      if (std::binary_search(shared_.begin(), shared_.end(), id)) {
+        copyKeys(found->second, subRecord, keys);
+      } else {
+        // Named by this event alone: taken, and the rest of the record released at once.
+        takeKeys(found->second, subRecord, keys);
+        records_.erase(found);
+      }
+      flattened.emplace_back(std::move(subRecord));
+    }
+    event.set(icalKey, std::move(flattened));
+  }
+
+ private:
+  tessel::RecordMap records_;
+  // Identifiers named more than once, sorted.
+  std::vector<std::string_view> shared_;
+};
+
 const Array& emptyArray() {
   static const Array empty;
   return empty;
+}
+
+// One event or task of the calendar into the matching array (see appendCalEntity). `record`
+// is copied from when const and moved from otherwise; `appendSubEntities` stores one
+// relationship's records into the event.
+template <typename Record, typename AppendSubEntities>
+bool flattenEntity(Record& record, Array* eventArray, Array* taskArray,
+                   const tessel::RecordMap& allEntities, AppendSubEntities&& appendSubEntities) {
+  const std::string* entity = record.stringAt(TesselRecordEntityNameKey);
+  if (!entity) {
+    Log::debug("No entity type for calendar record:\n%@", RecordDescription{record});
+    return true;
+  }
+
+  if (*entity == TesselEntity_Calendars_Event) {
+    Dictionary event;
+    takeKeys(record, event, kEventFilteredKeys);
+    for (const SubEntity& sub : subEntities()) {
+      const Value* relationship = record.find(sub.relationship);
+      if (!relationship) continue;
+      const Array* identifiers = relationship->asArray();
+      if (!appendSubEntities(identifiers ? *identifiers : emptyArray(), sub.keys, sub.icalKey,
+                             event)) {
+        return false;
+      }
+    }
+
+    const Value* detached = record.find(TesselRelationship_Calendars_Event_DetachedEvents);
+    const Array* detachedIDs = detached ? detached->asArray() : nullptr;
+    if (detachedIDs && std::any_of(detachedIDs->begin(), detachedIDs->end(),
+                                   [](const Value& id) { return id.asString() != nullptr; })) {
+      // A detached occurrence replaces one instance of the rule, so the rule must skip it.
+      Array exceptionDates;
+      if (Value* dates = event.find(TesselAttribute_Calendars_Event_ExceptionDates)) {
+        if (Array* array = dates->asArray()) exceptionDates = std::move(*array);
+      }
+      for (const Value& element : *detachedIDs) {
+        const std::string* identifier = element.asString();
+        if (!identifier) continue;
+        auto occurrence = allEntities.find(*identifier);
+        if (occurrence == allEntities.end()) continue;
+        if (const Value* date =
+                occurrence->second.find(TesselAttribute_Calendars_Event_OriginalDate)) {
+          exceptionDates.push_back(*date);
+        }
+      }
+      event.set(TesselAttribute_Calendars_Event_ExceptionDates, std::move(exceptionDates));
+    }
+
+    if (eventArray) eventArray->emplace_back(std::move(event));
+    return true;
+  }
+
+  if (*entity == TesselEntity_Calendars_Task) {
+    Dictionary task;
+    takeKeys(record, task, kTaskFilteredKeys);
+    if (taskArray) taskArray->emplace_back(std::move(task));
+    return true;
+  }
+
+  Log::debug("Unkown calendar entity type:\n%@", RecordDescription{record});
+  return true;
 }
 
 }  // namespace
@@ -197,57 +360,11 @@ bool CalendarFlattener::appendCalSubEntities(const Array& identifiers, KeyList f
 bool CalendarFlattener::appendCalEntity(const Dictionary& record, Array* eventArray,
                                         Array* taskArray,
                                         const tessel::RecordMap& allEntities) const {
-  const std::string* entity = record.stringAt(TesselRecordEntityNameKey);
-  if (!entity) {
-    Log::debug("No entity type for calendar record:\n%@", RecordDescription{record});
-    return true;
-  }
-
-  if (*entity == TesselEntity_Calendars_Event) {
-    Dictionary event;
-    copyKeys(record, event, kEventFilteredKeys);
-    for (const SubEntity& sub : subEntities()) {
-      const Value* relationship = record.find(sub.relationship);
-      if (!relationship) continue;
-      const Array* identifiers = relationship->asArray();
-      if (!appendCalSubEntities(identifiers ? *identifiers : emptyArray(), sub.keys, sub.icalKey,
-                                event)) {
-        return false;
-      }
-    }
-
-    std::vector<std::string> detached =
-        platform::stringsIn(record.find(TesselRelationship_Calendars_Event_DetachedEvents));
-    if (!detached.empty()) {
-      // A detached occurrence replaces one instance of the rule, so the rule must skip it.
-      Array exceptionDates;
-      if (const Array* dates = event.arrayAt(TesselAttribute_Calendars_Event_ExceptionDates)) {
-        exceptionDates = *dates;
-      }
-      for (const std::string& identifier : detached) {
-        auto occurrence = allEntities.find(identifier);
-        if (occurrence == allEntities.end()) continue;
-        if (const Value* date =
-                occurrence->second.find(TesselAttribute_Calendars_Event_OriginalDate)) {
-          exceptionDates.push_back(*date);
-        }
-      }
-      event.set(TesselAttribute_Calendars_Event_ExceptionDates, std::move(exceptionDates));
-    }
-
-    if (eventArray) eventArray->emplace_back(std::move(event));
-    return true;
-  }
-
-  if (*entity == TesselEntity_Calendars_Task) {
-    Dictionary task;
-    copyKeys(record, task, kTaskFilteredKeys);
-    if (taskArray) taskArray->emplace_back(std::move(task));
-    return true;
-  }
-
-  Log::debug("Unkown calendar entity type:\n%@", RecordDescription{record});
-  return true;
+  return flattenEntity(
+      record, eventArray, taskArray, allEntities,
+      [this](const Array& identifiers, KeyList keys, std::string_view icalKey, Dictionary& event) {
+        return appendCalSubEntities(identifiers, keys, icalKey, event);
+      });
 }
 
 std::optional<Dictionary> CalendarFlattener::flattenCalendar(const Dictionary& calendar,
@@ -276,10 +393,19 @@ std::optional<Dictionary> CalendarFlattener::flattenCalendar(const Dictionary& c
   if (eventsValue || tasksValue) {
     // One request for the whole calendar; the same map answers the detached occurrences.
     tessel::RecordMap allEntities = snapshot_.recordsWithIdentifiers(members);
+    members = {};
+    // And one request for all the records the events relate to.
+    SubRecords subRecords(snapshot_, allEntities);
+    auto appendSubEntities = [&subRecords](const Array& identifiers, KeyList keys,
+                                           std::string_view icalKey, Dictionary& event) {
+      subRecords.append(identifiers, keys, icalKey, event);
+      return true;
+    };
     if (events) events->reserve(allEntities.size());
-    for (const auto& [identifier, record] : allEntities) {
-      if (!appendCalEntity(record, events ? &*events : nullptr, tasks ? &*tasks : nullptr,
-                           allEntities)) {
+    // The records are read no further than their own turn, so their values are moved.
+    for (auto& [identifier, record] : allEntities) {
+      if (!flattenEntity(record, events ? &*events : nullptr, tasks ? &*tasks : nullptr,
+                         allEntities, appendSubEntities)) {
         return std::nullopt;
       }
     }

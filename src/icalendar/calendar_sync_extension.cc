@@ -6,6 +6,7 @@
 #include <optional>
 #include <string_view>
 #include <utility>
+#include <vector>
 
 #include "icalendar/icalendar_export.h"
 #include "platform/calendar_date.h"
@@ -74,6 +75,36 @@ void appendOffsetLine(std::string& buffer, std::int32_t seconds) {
 std::string timezoneBlockID(const platform::TimeZone& zone) {
   if (std::optional<std::string> name = zone.name()) return std::move(*name);
   return unknownZoneID(probe(zone));
+}
+
+void appendTimezoneBlockID(const platform::TimeZone& zone, std::string& buffer) {
+  if (zone.isLocal()) {
+    // The local zone's name follows $TZ, so it is never kept.
+    buffer += timezoneBlockID(zone);
+    return;
+  }
+  // Equal zones (the same name, or the same offsets and rule) have the same text.
+  struct Known {
+    platform::TimeZone zone;
+    std::string id;
+  };
+  constexpr std::size_t kKept = 8;
+  thread_local std::vector<Known> known;
+  thread_local std::size_t next = 0;
+  for (const Known& entry : known) {
+    if (entry.zone == zone) {
+      buffer += entry.id;
+      return;
+    }
+  }
+  std::string id = timezoneBlockID(zone);
+  buffer += id;
+  if (known.size() < kKept) {
+    known.push_back({zone, std::move(id)});
+  } else {
+    known[next] = {zone, std::move(id)};
+    next = (next + 1) % kKept;
+  }
 }
 
 void appendCalendarRepresentationTo(const platform::TimeZone& zone, std::string& buffer) {

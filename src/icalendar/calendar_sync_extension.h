@@ -16,6 +16,9 @@ namespace zt::icalendar {
 // The zone's name, or "UNKNOWN-<standard>-<daylight>" in seconds for an unnamed zone
 // (UNKNOWN-3600-0 when no daylight time was seen).
 std::string timezoneBlockID(const platform::TimeZone& zone);
+// Appends the same text. The texts of the last few zones are kept, so that writing many
+// dates in a few zones neither copies names nor samples zones again.
+void appendTimezoneBlockID(const platform::TimeZone& zone, std::string& buffer);
 
 // Appends BEGIN:VTIMEZONE, TZID, a STANDARD and/or a DAYLIGHT sub-component holding only
 // TZOFFSETTO (unsigned when not negative: 0100, -0500), and END:VTIMEZONE.

@@ -1,8 +1,10 @@
 #include "icalendar/icalendar_export.h"
 
+#include <algorithm>
 #include <charconv>
 #include <cstdint>
 #include <cstdlib>
+#include <cstring>
 
 #include "icalendar/zeto_calendar_export.h"
 #include "platform/ascii.h"
@@ -116,6 +118,38 @@ std::string& fold(std::string& buffer) {
   return buffer;
 }
 
+void foldRFC2445From(std::string& buffer, std::size_t start) {
+  const std::size_t length = buffer.size() - start;
+  if (length < kFoldLimit) return;
+  const auto isAscii = [](char c) { return static_cast<unsigned char>(c) < 0x80; };
+  if (!std::all_of(buffer.begin() + static_cast<std::ptrdiff_t>(start), buffer.end(), isAscii)) {
+    std::string line = buffer.substr(start);
+    buffer.resize(start);
+    buffer += fold(line);
+    return;
+  }
+  // ASCII text: one unit per byte, so a fold goes before every multiple of the limit, the
+  // very end included. The pieces move back from the last one, in place.
+  constexpr std::string_view kFold = "\r\n ";
+  const std::size_t folds = length / kFoldLimit;
+  buffer.resize(buffer.size() + folds * kFold.size());
+  char* const line = buffer.data() + start;
+  std::size_t from = length;
+  std::size_t to = length + folds * kFold.size();
+  for (std::size_t k = folds; k > 0; --k) {
+    const std::size_t piece = k * kFoldLimit;
+    to -= from - piece;
+    std::memmove(line + to, line + piece, from - piece);
+    to -= kFold.size();
+    std::memcpy(line + to, kFold.data(), kFold.size());
+    from = piece;
+  }
+}
+
+void appendEscapedRFC2445Value(std::string& buffer, std::string_view text) {
+  escapeInto<false>(buffer, text);
+}
+
 void appendQuotedString(std::string& buffer, std::string_view text) {
   if (isQuoted(text)) {
     buffer += text;
@@ -163,8 +197,10 @@ void appendDatePropertyLine(std::string& buffer, std::string_view name,
 void appendDatePropertyLine(std::string& buffer, std::string_view name,
                             const platform::Value& value) {
   if (const platform::CalendarDate* date = value.asDate()) {
-    platform::CalendarDate copy = *date;
-    appendDatePropertyLine(buffer, name, copy);
+    // The text of the date as it would be switched to GMT, the value left as it is.
+    buffer += name;
+    appendPropertyValueRepresentation(buffer, *date);
+    buffer += "\r\n";
     return;
   }
   buffer += name;

@@ -30,6 +30,11 @@ void appendRFC2445Line(std::string& buffer, std::string_view text);
 // Folds the buffer in place: "\r\n " before units 72, 144, ... of the unfolded text, and
 // also at the very end when the length is an exact multiple of 72. Returns the buffer.
 std::string& fold(std::string& buffer);
+// Folds in place the text from `start` to the end of the buffer, as fold() folds a copy of
+// it; the text before `start` is left alone.
+void foldRFC2445From(std::string& buffer, std::size_t start);
+// Appends the text escaped as escapeRFC2445Value escapes it.
+void appendEscapedRFC2445Value(std::string& buffer, std::string_view text);
 // Appends the text unchanged when it both begins and ends with a double quote, else quoted.
 void appendQuotedString(std::string& buffer, std::string_view text);
 // The same test on the buffer itself: quotes it in place unless already quoted.

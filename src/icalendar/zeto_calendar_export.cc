@@ -149,6 +149,29 @@ std::string iCalendarPropertyValueRepresentation(CalendarDate& date) {
   return dateTimePropertyValue(date);
 }
 
+void appendPropertyValueRepresentation(std::string& buffer, const CalendarDate& date) {
+  const TimeZone& zone = date.timeZone();
+  const CalendarDate::Fields fields = date.fields();
+  if (isUniversalZone(zone)) {
+    buffer += ':';
+    if (isNoon(fields)) {
+      appendDate(buffer, fields);
+    } else {
+      appendDateTime(buffer, fields);
+      buffer += 'Z';
+    }
+    return;
+  }
+  if (zone.isLocal()) {
+    buffer += ':';
+  } else {
+    buffer += ";TZID=";
+    appendTimezoneBlockID(zone, buffer);
+    buffer += ':';
+  }
+  appendDateTime(buffer, fields);
+}
+
 // --- Recurrence words ---------------------------------------------------------------------
 
 std::string_view iCalendarRepresentationForFrequency(std::string_view word) {

@@ -37,6 +37,9 @@ std::string dateOnlyPropertyValue(const platform::CalendarDate& date);
 std::string dateTimePropertyValue(platform::CalendarDate& date);
 // dateOnlyPropertyValue for a whole day, else dateTimePropertyValue.
 std::string iCalendarPropertyValueRepresentation(platform::CalendarDate& date);
+// Appends the same text, leaving the date in its own zone (the switch to GMT changes no
+// text).
+void appendPropertyValueRepresentation(std::string& buffer, const platform::CalendarDate& date);
 
 // --- Recurrence words ---------------------------------------------------------------------
 

@@ -46,19 +46,7 @@ bool isStatusKey(std::string_view key) {
 // Folds the line that starts at `start` of `out` (RFC 2445 section 4.1, at the device's
 // limit). Most lines are short and are never copied.
 void foldFrom(std::string& out, std::size_t start) {
-  if (out.size() - start < kFoldLimit) return;
-  std::string line = out.substr(start);
-  out.resize(start);
-  out += fold(line);
-}
-
-// One folded property line, CR LF ended: the property's name and the rest of the line.
-void appendFoldedLine(std::string& out, std::string_view name, std::string_view rest) {
-  const std::size_t start = out.size();
-  out += name;
-  out += rest;
-  foldFrom(out, start);
-  out += "\r\n";
+  foldRFC2445From(out, start);
 }
 
 // Title and order are written as they stand.
@@ -86,8 +74,10 @@ const Array* nonEmptyArray(const Value& value) {
 
 void ZetoCalendarExporter::setupData(std::vector<std::uint8_t>& buffer, const Dictionary& record) {
   const ZetoCalendarExporter exporter;
-  const std::string text = exporter.calendarFromRecords(record);
-  buffer.assign(text.begin(), text.end());
+  std::string text = exporter.calendarFromRecords(record);
+  // One block copy of the bytes; the text goes at once.
+  const auto* bytes = reinterpret_cast<const std::uint8_t*>(text.data());
+  buffer.assign(bytes, bytes + text.size());
 }
 
 ZetoCalendarExporter::ZetoCalendarExporter()
@@ -168,6 +158,8 @@ std::vector<std::string> ZetoCalendarExporter::timeZoneIdentifiersInCalendar(
       tessel::TesselAttribute_Calendars_Event_EndDate,
   };
   std::vector<std::string> names;
+  // Zones already looked at: equal named zones have equal names, and the others have none.
+  std::vector<platform::TimeZone> seen;
   // Exception dates and rule end dates are written in UTC or with their own TZID and are
   // not looked at here.
   for (std::string_view entity :
@@ -181,7 +173,9 @@ std::vector<std::string> ZetoCalendarExporter::timeZoneIdentifiersInCalendar(
         const CalendarDate* date = fields->dateAt(key);
         if (!date) continue;
         const platform::TimeZone& zone = date->timeZone();
+        if (std::find(seen.begin(), seen.end(), zone) != seen.end()) continue;
         if (isUniversalZone(zone) || zone.isLocal()) continue;
+        seen.push_back(zone);
         std::optional<std::string> name = zone.name();
         if (name && std::find(names.begin(), names.end(), *name) == names.end()) {
           names.push_back(std::move(*name));
@@ -240,52 +234,58 @@ bool ZetoCalendarExporter::appendPropertyForKey(std::string& out, std::string_vi
 
 void ZetoCalendarExporter::appendMappedProperty(std::string& out, std::string_view property,
                                                 const Value& value) const {
-  if (const CalendarDate* date = value.asDate()) {
-    // Writing a date may switch it to GMT; the record stays as the caller gave it.
-    CalendarDate copy = *date;
-    appendDatePropertyLine(out, property, copy);
+  if (value.asDate()) {
+    // Written as if switched to GMT; the record stays as the caller gave it.
+    appendDatePropertyLine(out, property, value);
     return;
   }
-  const std::string* text = value.asString();
-  appendFoldedLine(out, property,
-                   ":" + iCalendarEscapeValue(text ? *text : iCalendarRepresentation(value)));
+  const std::size_t start = out.size();
+  out += property;
+  out += ':';
+  if (const std::string* text = value.asString()) {
+    appendEscapedRFC2445Value(out, *text);
+  } else {
+    appendEscapedRFC2445Value(out, iCalendarRepresentation(value));
+  }
+  foldFrom(out, start);
+  out += "\r\n";
 }
 
 bool ZetoCalendarExporter::appendOrganizer(std::string& out, const Value& value) const {
-  std::optional<std::string> address;
+  bool written = false;
   if (const Dictionary* organizer = value.asDictionary()) {
-    address = addressForRecord(*organizer);
+    written = appendAddressLine(out, "ORGANIZER", *organizer);
   } else if (const Array* organizers = value.asArray()) {
     // The flattened record lists the organizer like any related record; an empty list
     // is a broken record, and the export of the whole calendar is abandoned.
     if (organizers->empty()) throw std::out_of_range("organizer array is empty");
-    address = addressForRecord(recordOrEmpty(organizers->front()));
+    written = appendAddressLine(out, "ORGANIZER", recordOrEmpty(organizers->front()));
   }
-  if (!address) {
+  if (!written) {
     platform::Log::standardError("Organizer translation error");
     return false;
   }
-  appendFoldedLine(out, "ORGANIZER", *address);
   return true;
 }
 
 void ZetoCalendarExporter::appendAttendees(std::string& out, const Array& attendees) const {
   for (const Value& attendee : attendees) {
-    if (std::optional<std::string> address = addressForRecord(recordOrEmpty(attendee))) {
-      appendFoldedLine(out, "ATTENDEE", *address);
-    }
+    appendAddressLine(out, "ATTENDEE", recordOrEmpty(attendee));
   }
 }
 
 bool ZetoCalendarExporter::appendRecurrence(std::string& out, const Array& rules) const {
   // The device follows one rule per event; further rules are dropped.
   const Dictionary* first = rules.front().asDictionary();
-  std::optional<std::string> rule = first ? recurrenceRuleForRecord(*first) : std::nullopt;
-  if (!rule) {
+  if (!first) {
     platform::Log::standardError("Recurrence translation error");
     return false;
   }
-  appendFoldedLine(out, "RRULE:", *rule);
+  const std::size_t start = out.size();
+  out += "RRULE:";
+  appendRecurrenceRule(out, *first);
+  foldFrom(out, start);
+  out += "\r\n";
   return true;
 }
 
@@ -310,32 +310,68 @@ void ZetoCalendarExporter::appendAlarm(std::string& out, const Dictionary& alarm
   appendRFC2445ComponentStart(out, "VALARM");
   out += "ACTION:DISPLAY\r\n";
   for (const auto& [key, value] : alarm) {
-    std::string line;
+    const std::size_t start = out.size();
     if (isAnyOf(key, {tessel::TesselAttribute_Calendars_AudioAlarm_Description,
                       tessel::TesselAttribute_Calendars_DisplayAlarm_Description,
                       tessel::TesselAttribute_Calendars_MailAlarm_Description})) {
-      line = "DESCRIPTION:";
+      out += "DESCRIPTION:";
       if (const std::string* description = value.asString()) {
-        line += iCalendarEscapeValue(*description);
+        appendEscapedRFC2445Value(out, *description);
       } else {
-        line += iCalendarEscapeValue(iCalendarRepresentation(value));
+        appendEscapedRFC2445Value(out, iCalendarRepresentation(value));
       }
     } else if (isAnyOf(key, {tessel::TesselAttribute_Calendars_AudioAlarm_Triggerduration,
                              tessel::TesselAttribute_Calendars_DisplayAlarm_Triggerduration,
                              tessel::TesselAttribute_Calendars_MailAlarm_Triggerduration})) {
       const platform::Number* seconds = value.asNumber();
       if (!seconds) continue;
-      line = "TRIGGER:";
-      line += iCalendarDurationRepresentation(*seconds);
+      out += "TRIGGER:";
+      out += iCalendarDurationRepresentation(*seconds);
     } else {
       continue;
     }
     // These two lines are folded with their line end counted, which the device's reader
     // expects: a fold can land after the CR LF, or between CR and LF.
-    line += "\r\n";
-    out += fold(line);
+    out += "\r\n";
+    foldFrom(out, start);
   }
   appendRFC2445ComponentEnd(out, "VALARM");
+}
+
+bool ZetoCalendarExporter::appendAddressLine(std::string& out, std::string_view name,
+                                             const Dictionary& address) const {
+  const Value* email = address.find(tessel::TesselAttribute_Calendars_Attendee_Email);
+  if (!email) {
+    // Nothing is written, but the parameters are read as addressForRecord reads them.
+    (void)addressForRecord(address);
+    return false;
+  }
+  const std::size_t start = out.size();
+  out += name;
+  for (const auto& [key, value] : address) {
+    if (key == tessel::TesselAttribute_Calendars_Attendee_CommonName) {
+      // RFC 2445 section 4.2.2: the name is quoted, as it may hold ":" ";" or ",".
+      appendRFC2445ParameterName(out, "CN");
+      if (const std::string* commonName = value.asString()) {
+        appendQuotedString(out, *commonName);
+      } else {
+        out += iCalendarQuoted(iCalendarRepresentation(value));
+      }
+    } else if (key == tessel::TesselAttribute_Calendars_Attendee_Status) {
+      if (const std::string* word = value.asString()) {
+        appendRFC2445Parameter(out, "PARTSTAT", iCalendarRepresentationPartStat(*word));
+      }
+    }
+  }
+  out += ':';
+  if (const std::string* text = email->asString()) {
+    out += *text;
+  } else {
+    out += iCalendarRepresentation(*email);
+  }
+  foldFrom(out, start);
+  out += "\r\n";
+  return true;
 }
 
 std::optional<std::string> ZetoCalendarExporter::addressForRecord(const Dictionary& address) const {
@@ -359,6 +395,12 @@ std::optional<std::string> ZetoCalendarExporter::addressForRecord(const Dictiona
 
 std::optional<std::string> ZetoCalendarExporter::recurrenceRuleForRecord(
     const Dictionary& rule) const {
+  std::string text;
+  appendRecurrenceRule(text, rule);
+  return text;
+}
+
+void ZetoCalendarExporter::appendRecurrenceRule(std::string& text, const Dictionary& rule) const {
   struct Part {
     std::string_view key;
     std::string_view name;
@@ -375,7 +417,7 @@ std::optional<std::string> ZetoCalendarExporter::recurrenceRuleForRecord(
   };
 
   // RFC 2445 section 4.3.10 wants FREQ first.
-  std::string text = "FREQ=";
+  text += "FREQ=";
   const Value* frequency = rule.find(tessel::TesselAttribute_Calendars_Recurrence_Frequency);
   text += iCalendarRepresentationForFrequency(frequency ? iCalendarRepresentation(*frequency)
                                                         : std::string());
@@ -403,7 +445,6 @@ std::optional<std::string> ZetoCalendarExporter::recurrenceRuleForRecord(
       appendRFC2445Parameter(text, "BYDAY", *byDay);
     }
   }
-  return text;
 }
 
 std::string ZetoCalendarExporter::lineForExceptionDates(const Array& dates) const {

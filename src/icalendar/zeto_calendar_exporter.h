@@ -74,6 +74,12 @@ class ZetoCalendarExporter {
   void appendAttendees(std::string& out, const platform::Array& attendees) const;
   bool appendRecurrence(std::string& out, const platform::Array& rules) const;
   void appendAlarm(std::string& out, const platform::Dictionary& alarm) const;
+  // name, addressForRecord's text and CR LF, folded; false (and nothing written) without
+  // an email.
+  bool appendAddressLine(std::string& out, std::string_view name,
+                         const platform::Dictionary& address) const;
+  // recurrenceRuleForRecord's text, appended.
+  void appendRecurrenceRule(std::string& out, const platform::Dictionary& rule) const;
   void appendExceptionDates(std::string& out, const platform::Array& dates) const;
   bool appendStatus(std::string& out, const platform::Value* value) const;
 

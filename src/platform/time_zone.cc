@@ -4,6 +4,7 @@
 
 #include <cstdlib>
 #include <exception>
+#include <map>
 #include <mutex>
 
 namespace zt::platform {
@@ -217,13 +218,19 @@ std::optional<TimeZone> TimeZone::named(std::string_view name) {
   if (name == "GMT") return gmt();
   if (name == "UTC") return utc();
   if (name.empty()) return std::nullopt;
+  // Zones are immutable, so every date decoded in the same zone shares one: a run meets a
+  // handful of names, and decoding a date then allocates nothing for its zone.
+  static std::mutex mutex;
+  static std::map<std::string, TimeZone, std::less<>> known;
+  std::lock_guard lock(mutex);
+  if (auto found = known.find(name); found != known.end()) return found->second;
   try {
     const date::time_zone* zone = date::locate_zone(name);
     auto impl = std::make_shared<Impl>();
     impl->kind = Kind::Named;
     impl->name = std::string(name);
     impl->zone = zone;
-    return TimeZone(std::move(impl));
+    return known.emplace(std::string(name), TimeZone(std::move(impl))).first->second;
   } catch (const std::exception&) {
     return std::nullopt;
   }

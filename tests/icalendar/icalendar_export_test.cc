@@ -34,6 +34,20 @@ TEST(FoldingTest, FoldsEverySeventyTwoUtf16CodeUnitsOfTheUnfoldedLine) {
   EXPECT_EQ(line(a71 + "\xC3\xA9\xC3\xA9"), a71 + "\xC3\xA9\r\n \xC3\xA9\r\n");
 }
 
+// The exporter folds the end of its output buffer in place; that must give what folding a
+// copy gives, whatever character the fold falls next to.
+TEST(FoldingTest, FoldingTheEndOfABufferInPlaceGivesTheFoldOfACopy) {
+  for (const std::string unit : {"a", "\xC3\xA9", "\xF0\x9F\x98\x80"}) {
+    for (std::size_t length = 0; length <= 220; ++length) {
+      std::string text(length, 'x');
+      if (length > 0) text.replace(length / 2, 1, unit);
+      std::string buffer = "PREFIX:" + text;
+      foldRFC2445From(buffer, 7);
+      EXPECT_EQ(buffer, "PREFIX:" + fold(std::string_view(text))) << length << " " << unit;
+    }
+  }
+}
+
 TEST(EscapingTest, ValuesParametersAndQuotes) {
   EXPECT_EQ(iCalendarEscapeValue("a;b,c\\d"), "a\\;b\\,c\\\\d");
   EXPECT_EQ(iCalendarEscapeValue("x\ry\nz \"hi\" 10:30"), "x\\ny\\nz \\\"hi\\\" 10:30");
