@@ -1,5 +1,5 @@
 // The zones and times of imported iCalendar files: times at noon UTC stay times through the
-// writer.
+// writer, and TZIDs resolve to the zones of the time-zone database they mean.
 
 #include <gtest/gtest.h>
 
@@ -65,6 +65,75 @@ TEST(ICalZones, NoonUtcStaysATime) {
   }
   // No value anywhere is a bare date.
   EXPECT_FALSE(std::regex_search(text, std::regex(R"([:=]\d{8}(\r|;|\n|$))"))) << text;
+}
+
+// The zone of an event's start, by its name or, for an unnamed zone, its description.
+std::string startZone(const ICalCalendar& calendar, const std::string& uid) {
+  for (const Record& record : calendar.records) {
+    if (record.id != "cal/event/" + uid) continue;
+    const zt::platform::CalendarDate* start = record.record.dateAt("start date");
+    if (start == nullptr) return "(no start)";
+    return start->timeZone().name().value_or(start->timeZone().description());
+  }
+  return "(absent: " + uid + ")";
+}
+
+// TZIDs without a VTIMEZONE: IANA names in other forms and behind vendor prefixes, Windows
+// zone names and Outlook's display names.
+TEST(ICalZones, NamesWithoutVTimezone) {
+  const struct {
+    const char* tzid;
+    const char* zone;
+  } cases[] = {
+      {"Europe/Berlin", "Europe/Berlin"},
+      {"Europe_Berlin", "Europe/Berlin"},
+      {"Europe/lisbon", "Europe/Lisbon"},
+      {"america_new_york", "America/New_York"},
+      {"America-Chicago", "America/Chicago"},
+      {"/mozilla.org/20050126_1/Europe/Berlin", "Europe/Berlin"},
+      {"/softwarestudio.org/Olson_20011030_5/America/New_York", "America/New_York"},
+      {"/freeassociation.sourceforge.net/Tzfile/Europe/London", "Europe/London"},
+      {"/freeassociation.sourceforge.net/Tzfile/America/Argentina/Buenos_Aires",
+       "America/Argentina/Buenos_Aires"},
+      {"W. Europe Standard Time", "Europe/Berlin"},
+      {"(UTC-05:00) Eastern Time (US & Canada)", "America/New_York"},
+      {"(UTC-05:00) Eastern Time (US and Canada)", "America/New_York"},
+      {"(GMT+01:00) Amsterdam, Berlin, Bern, Rome, Stockholm, Vienna", "Europe/Berlin"},
+      {"(GMT+01:00) Brussels, Copenhagen, Madrid, Paris", "Europe/Paris"},
+      {"(GMT+10:00) Canberra, Melbourne, Sydney", "Australia/Sydney"},
+      {"Kuala Lumpur\\, Singapore", "Asia/Singapore"},
+      {"pacific time (us & canada)", "America/Los_Angeles"},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.tzid);
+    ICalCalendarSource source;
+    source.identifier = "cal";
+    source.files.push_back(
+        {"test.ics",
+         "BEGIN:VCALENDAR\r\nVERSION:2.0\r\nPRODID:-//Test//EN\r\nBEGIN:VEVENT\r\n"
+         "UID:x\r\nDTSTART;TZID=\"" +
+             std::string(c.tzid) + "\":20260110T090000\r\nEND:VEVENT\r\nEND:VCALENDAR\r\n"});
+    EXPECT_EQ(startZone(readICalCalendar(source), "x"), c.zone);
+  }
+}
+
+// TZIDs that only their VTIMEZONE explains: its X-LIC-LOCATION or TZURL, an Outlook display
+// name, and custom zones matched by their rules over the years the events use; a zone that
+// matches no zone of the database stays unnamed.
+TEST(ICalZones, NamesFromTheVTimezone) {
+  const ICalCalendar calendar = readZoneFile("by_vtimezone.ics");
+  const struct {
+    const char* uid;
+    const char* zone;
+  } cases[] = {
+      {"lisbon", "Europe/Lisbon"},         // X-LIC-LOCATION
+      {"office", "America/Chicago"},       // TZURL
+      {"customized", "America/New_York"},  // US rules since 2007, daylight time since 1970
+      {"down-under", "Australia/Sydney"},  // Australian rules, AEST/AEDT
+      {"outlook", "Europe/Berlin"},        // display name
+      {"nowhere", "UNNAMED 11820"},        // +03:17 is no zone's offset
+  };
+  for (const auto& c : cases) EXPECT_EQ(startZone(calendar, c.uid), c.zone) << c.uid;
 }
 
 }  // namespace
