@@ -21,6 +21,21 @@ std::string ComponentReader::name(icalproperty* property) const {
   return name != nullptr ? std::string(name) : std::string("property");
 }
 
+namespace {
+
+// The engine carries whole days as 12:00:00 in the GMT zone, and the calendar writer writes
+// any noon in the GMT or UTC zone as a DATE. A time at noon UTC (Google writes timed events
+// in UTC: 13:00 in Paris in winter) is kept in "Etc/UTC", the same offset under another name,
+// so that it stays a time (RFC 5545 section 3.3.5).
+TimeZone zoneOfUtcTime(const TimeZone& zone, const CalendarDate::Fields& f) {
+  if (f.hour != 12 || f.minute != 0 || f.second != 0) return zone;
+  if (zone != TimeZone::gmt() && zone != TimeZone::utc()) return zone;
+  static const TimeZone timed = TimeZone::named("Etc/UTC").value_or(TimeZone::utc());
+  return timed;
+}
+
+}  // namespace
+
 ReadDate ComponentReader::date(icalproperty* property, const icaltimetype& t,
                                const std::optional<TimeZone>& floatingZone) const {
   check(property, t);
@@ -29,14 +44,16 @@ ReadDate ComponentReader::date(icalproperty* property, const icaltimetype& t,
     return {CalendarDate::fromFields({t.year, t.month, t.day, 12, 0, 0}, TimeZone::gmt()), true};
   }
   const CalendarDate::Fields fields{t.year, t.month, t.day, t.hour, t.minute, second};
-  if (icaltime_is_utc(t)) return {CalendarDate::fromFields(fields, TimeZone::utc()), false};
+  if (icaltime_is_utc(t)) {
+    return {CalendarDate::fromFields(fields, zoneOfUtcTime(TimeZone::utc(), fields)), false};
+  }
   if (std::optional<std::string> tzid = parameter(property, "TZID")) {
     std::optional<TimeZone> zone = zones_.zone(*tzid);
     if (!zone) {
       throw error(property, name(property) + ": no VTIMEZONE defines the time zone \"" + *tzid +
                                 "\", and it is no IANA or Windows zone name");
     }
-    return {CalendarDate::fromFields(fields, *zone), false};
+    return {CalendarDate::fromFields(fields, zoneOfUtcTime(*zone, fields)), false};
   }
   return {CalendarDate::fromFields(fields, floatingZone ? *floatingZone : TimeZone::local()),
           false};

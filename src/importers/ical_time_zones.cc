@@ -2,8 +2,11 @@
 
 #include <libical/ical.h>
 
+#include <algorithm>
+#include <chrono>
 #include <cstdint>
 #include <cstdlib>
+#include <functional>
 #include <tuple>
 #include <vector>
 
@@ -20,17 +23,52 @@ bool isPlausibleOffset(int seconds) {
   return std::abs(seconds) < 86400;
 }
 
-std::optional<TimeZone> namedZone(std::string_view name) {
+// The key under which a database name is also found: lower case, and "/", "_", "-" and
+// spaces alike ("Europe_Berlin", "europe/berlin", "US-Eastern").
+std::string looseKey(std::string_view name) {
+  std::string key;
+  for (char c : name) {
+    if (c >= 'A' && c <= 'Z') c = static_cast<char>(c - 'A' + 'a');
+    if (c == '/' || c == '-' || c == ' ') c = '_';
+    key += c;
+  }
+  return key;
+}
+
+std::optional<TimeZone> databaseZone(std::string_view name) {
   if (auto zone = TimeZone::named(name)) return zone;
+  // Of two names of the same key, the first in the database's order counts.
+  static const std::map<std::string, std::string, std::less<>> index = [] {
+    std::map<std::string, std::string, std::less<>> keys;
+    for (const std::string& known : TimeZone::databaseZoneNames()) {
+      keys.emplace(looseKey(known), known);
+    }
+    return keys;
+  }();
+  const auto found = index.find(looseKey(name));
+  if (found == index.end()) return std::nullopt;
+  return TimeZone::named(found->second);
+}
+
+std::optional<TimeZone> namedZone(std::string_view name) {
+  if (auto zone = databaseZone(name)) return zone;
   // "/freeassociation.sourceforge.net/Tzfile/Europe/London", "/mozilla.org/20070129_1/
-  // Europe/Berlin": the IANA name follows a vendor prefix.
+  // Europe/Berlin", "http://tzurl.org/zoneinfo-outlook/Europe/Berlin": the IANA name
+  // ("Area/Location") follows a vendor prefix.
   for (std::size_t slash = name.find('/'); slash != std::string_view::npos;
        slash = name.find('/', slash + 1)) {
     const std::string_view rest = name.substr(slash + 1);
     if (rest.find('/') == std::string_view::npos) break;
-    if (auto zone = TimeZone::named(rest)) return zone;
+    if (auto zone = databaseZone(rest)) return zone;
   }
   return std::nullopt;
+}
+
+// The zone a TZURL names: tzurl.org's addresses end with the IANA name, maybe with ".ics".
+std::optional<TimeZone> zoneOfUrl(std::string_view url) {
+  url = url.substr(0, url.find_first_of("?#"));
+  if (url.size() > 4 && url.substr(url.size() - 4) == ".ics") url.remove_suffix(4);
+  return namedZone(url);
 }
 
 struct Observance {
@@ -71,10 +109,12 @@ std::vector<Observance> observancesOf(icalcomponent* vtimezone) {
   return observances;
 }
 
-const Observance* latest(const std::vector<Observance>& observances, bool daylight) {
+// The observance of that kind that began last, up to the year `until`.
+const Observance* latest(const std::vector<Observance>& observances, bool daylight,
+                         int until = 9999) {
   const Observance* found = nullptr;
   for (const Observance& observance : observances) {
-    if (observance.daylight != daylight) continue;
+    if (observance.daylight != daylight || observance.start.year > until) continue;
     if (found == nullptr || startKey(observance.start) >= startKey(found->start)) {
       found = &observance;
     }
@@ -127,16 +167,17 @@ std::optional<std::string> posixTransition(const Observance& observance) {
   return text;
 }
 
-}  // namespace
-
-std::optional<TimeZone> unnamedZoneOfVTimezone(icalcomponent* vtimezone) {
-  const std::vector<Observance> observances = observancesOf(vtimezone);
-  const Observance* standard = latest(observances, false);
-  const Observance* daylight = latest(observances, true);
+// The unnamed zone of the observances in force in the year `year`: a VTIMEZONE of several
+// eras often leaves the older rules without an UNTIL.
+std::optional<TimeZone> unnamedZoneOfObservances(const std::vector<Observance>& observances,
+                                                 int year) {
+  const Observance* standard = latest(observances, false, year);
+  const Observance* daylight = latest(observances, true, year);
   if (standard == nullptr && daylight == nullptr) return std::nullopt;
   if (standard == nullptr) return TimeZone::unnamed(daylight->offsetTo);
   // A daylight rule that ended (UNTIL) is history: the zone keeps standard time now.
-  if (daylight == nullptr || !daylight->rule || !icaltime_is_null_time(daylight->rule->until)) {
+  if (daylight == nullptr || !daylight->rule ||
+      (!icaltime_is_null_time(daylight->rule->until) && daylight->rule->until.year < year)) {
     return TimeZone::unnamed(standard->offsetTo);
   }
   const std::optional<std::string> begins = posixTransition(*daylight);
@@ -149,15 +190,192 @@ std::optional<TimeZone> unnamedZoneOfVTimezone(icalcomponent* vtimezone) {
   return TimeZone::unnamed(standard->offsetTo);
 }
 
+// --- Zones known only by their rules -------------------------------------------------------
+
+// The offsets a VTIMEZONE gives, hour by hour over whole years, as libical expands its
+// observances (RRULE and RDATE alike).
+class VTimezoneClock {
+ public:
+  explicit VTimezoneClock(icalcomponent* vtimezone) : zone_(icaltimezone_new()) {
+    if (zone_ != nullptr &&
+        icaltimezone_set_component(zone_, icalcomponent_new_clone(vtimezone)) == 0) {
+      icaltimezone_free(zone_, 1);
+      zone_ = nullptr;
+    }
+  }
+  ~VTimezoneClock() {
+    if (zone_ != nullptr) icaltimezone_free(zone_, 1);
+  }
+  VTimezoneClock(const VTimezoneClock&) = delete;
+  VTimezoneClock& operator=(const VTimezoneClock&) = delete;
+
+  bool valid() const { return zone_ != nullptr; }
+
+  // The offset in force at an instant.
+  int offsetAt(std::chrono::sys_seconds instant) const {
+    icaltimetype t =
+        icaltime_from_timet_with_zone(static_cast<time_t>(instant.time_since_epoch().count()), 0,
+                                      icaltimezone_get_utc_timezone());
+    int daylight = 0;
+    return icaltimezone_get_utc_offset_of_utc_time(zone_, &t, &daylight);
+  }
+
+ private:
+  icaltimezone* zone_;
+};
+
+std::chrono::sys_seconds startOfYear(int year) {
+  using namespace std::chrono;
+  return sys_seconds{sys_days{std::chrono::year{year} / January / 1}.time_since_epoch()};
+}
+
+// The zone of the database whose offsets are those of `offsetAt` at every hour of the
+// years `first` to `last`. Of several, the one chosen has the VTIMEZONE's TZNAMEs as its
+// abbreviations, then is a zone Windows names (the zones most people use, the most used
+// first: America/New_York before America/Indianapolis), then not an "Etc/" zone, then keeps closest
+// to the VTIMEZONE in the years before, then comes first in the database.
+std::optional<TimeZone> zoneMatchingOffsets(
+    const std::function<int(std::chrono::sys_seconds)>& offsetAt,
+    const std::vector<std::string>& abbreviations, int first, int last) {
+  using namespace std::chrono;
+  std::vector<std::int32_t> offsets;
+  for (int year = first; year <= last; ++year) {
+    for (sys_seconds at = startOfYear(year); at < startOfYear(year + 1); at += hours{1}) {
+      const int offset = offsetAt(at);
+      if (!isPlausibleOffset(offset)) return std::nullopt;
+      offsets.push_back(offset);
+    }
+  }
+  if (offsets.empty()) return std::nullopt;
+  const std::vector<std::string>& common = ianaZonesOfDisplayNames();
+
+  const sys_seconds begin = startOfYear(first);
+  // How close a zone keeps to the VTIMEZONE in the years before, day by day.
+  std::vector<std::int32_t> before;
+  const sys_seconds earlier = startOfYear(std::max(1970, first - 40));
+  for (sys_seconds at = earlier + hours{12}; at < begin; at += days{1}) {
+    before.push_back(offsetAt(at));
+  }
+  auto closeness = [&](const TimeZone& zone) {
+    int same = 0;
+    for (std::size_t i = 0; i < before.size(); ++i) {
+      same += zone.secondsFromGMT(earlier + hours{12} + days{i}) == before[i] ? 1 : 0;
+    }
+    return same;
+  };
+
+  std::optional<TimeZone> best;
+  int bestScore = -1;
+  std::ptrdiff_t bestRank = 0;
+  int bestCloseness = -1;
+  for (const std::string& name : TimeZone::databaseZoneNames()) {
+    std::optional<TimeZone> candidate = TimeZone::named(name);
+    if (!candidate || candidate->kind() != TimeZone::Kind::Named) continue;
+    // The offsets of January and July first weed out most zones.
+    if (candidate->secondsFromGMT(begin + days{14}) != offsets[14 * 24] ||
+        candidate->secondsFromGMT(begin + days{195}) != offsets[195 * 24]) {
+      continue;
+    }
+    bool same = true;
+    for (std::size_t hour = 0; same && hour < offsets.size(); ++hour) {
+      same = candidate->secondsFromGMT(begin + hours{hour}) == offsets[hour];
+    }
+    if (!same) continue;
+    int score = 0;
+    if (!abbreviations.empty()) {
+      const std::string winter = candidate->abbreviation(begin + days{14});
+      const std::string summer = candidate->abbreviation(begin + days{195});
+      auto known = [&](const std::string& abbreviation) {
+        return std::find(abbreviations.begin(), abbreviations.end(), abbreviation) !=
+               abbreviations.end();
+      };
+      if (known(winter) && known(summer)) score += 4;
+    }
+    const auto rank = std::find(common.begin(), common.end(), name) - common.begin();
+    if (rank < static_cast<std::ptrdiff_t>(common.size())) score += 2;
+    if (name.find('/') != std::string::npos && name.rfind("Etc/", 0) != 0) score += 1;
+    if (score < bestScore || (score == bestScore && rank > bestRank)) continue;
+    const int close = closeness(*candidate);
+    if (score > bestScore || rank < bestRank || close > bestCloseness) {
+      bestScore = score;
+      bestRank = rank;
+      bestCloseness = close;
+      best = candidate;
+    }
+  }
+  return best;
+}
+
+std::vector<std::string> abbreviationsOf(icalcomponent* vtimezone) {
+  std::vector<std::string> abbreviations;
+  for (icalcomponent* part = icalcomponent_get_first_component(vtimezone, ICAL_ANY_COMPONENT);
+       part != nullptr; part = icalcomponent_get_next_component(vtimezone, ICAL_ANY_COMPONENT)) {
+    for (icalproperty* name = icalcomponent_get_first_property(part, ICAL_TZNAME_PROPERTY);
+         name != nullptr; name = icalcomponent_get_next_property(part, ICAL_TZNAME_PROPERTY)) {
+      if (const char* text = icalproperty_get_tzname(name)) abbreviations.push_back(text);
+    }
+  }
+  return abbreviations;
+}
+
+// The zone of the database that the VTIMEZONE describes: first read as libical expands it
+// (RFC 5545 section 3.6.5), then, for the VTIMEZONEs of several eras whose older rules have
+// no UNTIL, with the latest STANDARD and DAYLIGHT observances begun by each year.
+std::optional<TimeZone> zoneMatchingRules(icalcomponent* vtimezone, int first, int last) {
+  const std::vector<std::string> abbreviations = abbreviationsOf(vtimezone);
+  {
+    VTimezoneClock clock(vtimezone);
+    if (clock.valid()) {
+      auto offsetAt = [&](std::chrono::sys_seconds at) { return clock.offsetAt(at); };
+      if (auto zone = zoneMatchingOffsets(offsetAt, abbreviations, first, last)) return zone;
+    }
+  }
+  const std::vector<Observance> observances = observancesOf(vtimezone);
+  std::map<int, std::optional<TimeZone>> byYear;
+  auto offsetAt = [&](std::chrono::sys_seconds at) {
+    using namespace std::chrono;
+    const int year = static_cast<int>(year_month_day{floor<days>(at)}.year());
+    auto found = byYear.find(year);
+    if (found == byYear.end()) {
+      found = byYear.emplace(year, unnamedZoneOfObservances(observances, year)).first;
+    }
+    return found->second ? found->second->secondsFromGMT(at) : 86400;
+  };
+  return zoneMatchingOffsets(offsetAt, abbreviations, first, last);
+}
+
+}  // namespace
+
+std::optional<TimeZone> unnamedZoneOfVTimezone(icalcomponent* vtimezone) {
+  return unnamedZoneOfObservances(observancesOf(vtimezone), 9999);
+}
+
 ICalTimeZones::ICalTimeZones(icalcomponent* calendar) {
-  for (icalcompiter it = icalcomponent_begin_component(calendar, ICAL_VTIMEZONE_COMPONENT);
+  for (icalcompiter it = icalcomponent_begin_component(calendar, ICAL_ANY_COMPONENT);
        icalcompiter_deref(&it) != nullptr; icalcompiter_next(&it)) {
-    icalcomponent* vtimezone = icalcompiter_deref(&it);
-    icalproperty* tzid = icalcomponent_get_first_property(vtimezone, ICAL_TZID_PROPERTY);
+    icalcomponent* component = icalcompiter_deref(&it);
+    if (icalcomponent_isa(component) != ICAL_VTIMEZONE_COMPONENT) {
+      // The years the calendar's items start in, over which zones are matched by their rules.
+      icalproperty* start = icalcomponent_get_first_property(component, ICAL_DTSTART_PROPERTY);
+      const int year = start != nullptr ? icalproperty_get_dtstart(start).year : 0;
+      if (year >= kFirstMatchedYear && year <= kLastMatchedYear) {
+        firstYear_ = firstYear_ == 0 ? year : std::min(firstYear_, year);
+        lastYear_ = std::max(lastYear_, year);
+      }
+      continue;
+    }
+    icalproperty* tzid = icalcomponent_get_first_property(component, ICAL_TZID_PROPERTY);
     const char* name = tzid != nullptr ? icalproperty_get_tzid(tzid) : nullptr;
     // The first definition of a TZID counts.
-    if (name != nullptr) definitions_.emplace(name, vtimezone);
+    if (name != nullptr) definitions_.emplace(name, component);
   }
+  if (firstYear_ == 0) {
+    using namespace std::chrono;
+    firstYear_ = lastYear_ =
+        static_cast<int>(year_month_day{floor<days>(system_clock::now())}.year());
+  }
+  // The latest years count most: a long history is matched over its last twenty years.
+  firstYear_ = std::max(firstYear_, lastYear_ - 19);
 }
 
 std::optional<TimeZone> ICalTimeZones::zone(std::string_view tzid) {
@@ -167,14 +385,23 @@ std::optional<TimeZone> ICalTimeZones::zone(std::string_view tzid) {
 }
 
 std::optional<TimeZone> ICalTimeZones::resolve(std::string_view tzid) const {
+  // The IANA name, also in another case, with "_" for "/", or behind a vendor prefix.
   if (auto zone = namedZone(tzid)) return zone;
   const auto definition = definitions_.find(tzid);
   icalcomponent* vtimezone = definition != definitions_.end() ? definition->second : nullptr;
   if (vtimezone != nullptr) {
-    // Evolution names the IANA zone of its VTIMEZONEs in X-LIC-LOCATION.
-    for (icalproperty* property = icalcomponent_get_first_property(vtimezone, ICAL_X_PROPERTY);
+    // Evolution names the IANA zone of its VTIMEZONEs in X-LIC-LOCATION, others in a TZURL
+    // (RFC 5545 section 3.8.3.5).
+    for (icalproperty* property = icalcomponent_get_first_property(vtimezone, ICAL_ANY_PROPERTY);
          property != nullptr;
-         property = icalcomponent_get_next_property(vtimezone, ICAL_X_PROPERTY)) {
+         property = icalcomponent_get_next_property(vtimezone, ICAL_ANY_PROPERTY)) {
+      if (icalproperty_isa(property) == ICAL_TZURL_PROPERTY) {
+        const char* url = icalproperty_get_tzurl(property);
+        if (url == nullptr) continue;
+        if (auto zone = zoneOfUrl(url)) return zone;
+        continue;
+      }
+      if (icalproperty_isa(property) != ICAL_X_PROPERTY) continue;
       const char* name = icalproperty_get_x_name(property);
       const char* value = icalproperty_get_x(property);
       if (name == nullptr || value == nullptr || std::string_view(name) != "X-LIC-LOCATION") {
@@ -183,11 +410,19 @@ std::optional<TimeZone> ICalTimeZones::resolve(std::string_view tzid) const {
       if (auto zone = namedZone(value)) return zone;
     }
   }
-  if (auto iana = ianaZoneForWindowsZone(tzid)) {
+  // Outlook's Windows zone names and display names.
+  std::optional<std::string> iana = ianaZoneForWindowsZone(tzid);
+  if (!iana) {
+    if (std::optional<std::string_view> windows = windowsZoneForDisplayName(tzid)) {
+      iana = ianaZoneForWindowsZone(*windows);
+    }
+  }
+  if (iana) {
     if (auto zone = TimeZone::named(*iana)) return zone;
   }
-  if (vtimezone != nullptr) return unnamedZoneOfVTimezone(vtimezone);
-  return std::nullopt;
+  if (vtimezone == nullptr) return std::nullopt;
+  if (auto zone = zoneMatchingRules(vtimezone, firstYear_, lastYear_)) return zone;
+  return unnamedZoneOfVTimezone(vtimezone);
 }
 
 }  // namespace tessel::importers

@@ -12,11 +12,16 @@ struct icalcomponent_impl;
 namespace tessel::importers {
 
 // The zones that the TZID parameters of one VCALENDAR object name (RFC 5545 section 3.2.19:
-// a TZID refers to a VTIMEZONE of the same object). A TZID becomes, in this order:
-// - the zone of that name in the zone database, when it is an IANA name (also behind a
-//   "/vendor/version/" prefix, as Evolution and Mozilla write them, or as the VTIMEZONE's
-//   X-LIC-LOCATION);
-// - the IANA zone that Windows means by it, when it is a Windows zone name (Outlook);
+// a TZID refers to a VTIMEZONE of the same object). A TZID becomes the first of:
+// - the zone of the zone database of that name, also in another case, with "_" or "-" for
+//   "/" ("Europe_Berlin"), or behind a "/vendor/version/" prefix, as Evolution and Mozilla
+//   write them;
+// - the zone the VTIMEZONE's X-LIC-LOCATION or TZURL names (tzurl.org's addresses end with
+//   the IANA name);
+// - the IANA zone that Windows means by it, when it is a Windows zone name or the display
+//   name of one ("(UTC-05:00) Eastern Time (US & Canada)"), as Outlook writes them;
+// - the zone of the database whose offsets are those of the VTIMEZONE at every hour of the
+//   years the calendar's items start in (at most the last twenty);
 // - else an unnamed zone with the offsets and daylight rule of its VTIMEZONE.
 class ICalTimeZones {
  public:
@@ -29,7 +34,13 @@ class ICalTimeZones {
  private:
   std::optional<zt::platform::TimeZone> resolve(std::string_view tzid) const;
 
+  static constexpr int kFirstMatchedYear = 1970;
+  static constexpr int kLastMatchedYear = 2037;
+
   std::map<std::string, icalcomponent_impl*, std::less<>> definitions_;
+  // The years over which zones known by their rules are matched.
+  int firstYear_ = 0;
+  int lastYear_ = 0;
   std::map<std::string, std::optional<zt::platform::TimeZone>, std::less<>> resolved_;
 };
 

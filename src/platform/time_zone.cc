@@ -258,6 +258,18 @@ std::optional<TimeZone> TimeZone::unnamed(std::int32_t standardOffset,
   return TimeZone(std::move(impl));
 }
 
+const std::vector<std::string>& TimeZone::databaseZoneNames() {
+  static const std::vector<std::string> names = [] {
+    std::vector<std::string> all;
+    try {
+      for (const date::time_zone& zone : date::get_tzdb().zones) all.emplace_back(zone.name());
+    } catch (const std::exception&) {
+    }
+    return all;
+  }();
+  return names;
+}
+
 TimeZone::Kind TimeZone::kind() const {
   return impl_->kind;
 }
@@ -298,6 +310,11 @@ bool TimeZone::isDaylightSavingTime(std::chrono::sys_seconds instant) const {
 
 std::int32_t TimeZone::secondsFromGMT(std::chrono::sys_seconds instant) const {
   return infoAt(*impl_, instant).offset;
+}
+
+std::string TimeZone::abbreviation(std::chrono::sys_seconds instant) const {
+  if (impl_->kind != Kind::Named || !impl_->zone) return {};
+  return impl_->zone->get_info(date::sys_seconds{instant.time_since_epoch()}).abbrev;
 }
 
 std::chrono::sys_seconds TimeZone::instantAt(std::chrono::local_seconds wallClock) const {

@@ -6,6 +6,7 @@
 #include <optional>
 #include <string>
 #include <string_view>
+#include <vector>
 
 namespace zt::platform {
 
@@ -39,6 +40,10 @@ class TimeZone {
                                          std::optional<std::int32_t> daylightOffset = {},
                                          std::string_view daylightRule = {});
 
+  // The names of the zones of the time-zone database, in its order; other names of zones
+  // ("US/Eastern") are among them.
+  static const std::vector<std::string>& databaseZoneNames();
+
   Kind kind() const;
   bool isLocal() const { return kind() == Kind::Local; }
 
@@ -53,6 +58,9 @@ class TimeZone {
 
   bool isDaylightSavingTime(std::chrono::sys_seconds instant) const;
   std::int32_t secondsFromGMT(std::chrono::sys_seconds instant) const;
+  // The abbreviation the database gives a named zone at that instant ("CET"); empty for the
+  // other kinds and for "GMT" and "UTC".
+  std::string abbreviation(std::chrono::sys_seconds instant) const;
 
   // The instant at which the zone's wall clock shows `wallClock`. A time that the clock skips
   // (spring forward) is read with the offset in force before the gap; a time it shows twice
