@@ -92,13 +92,13 @@ int make(const fs::path& folder, int count, std::uint64_t seed) {
     // Sizes spread evenly on a log scale between the smallest and the largest.
     const double low = kSmallest * 1.1, high = kLargest * 0.9;
     const double target = low * std::pow(high / low, random.unit());
-    const double aspect = 0.75 + random.unit() * 0.6;
+    const double shape = 0.75 + random.unit() * 0.6;
     const int amplitude = 6 + static_cast<int>(random.next() % 30);
     const std::uint64_t pictureSeed = random.next();
     double pixels = target / perPixel[png];
     Data bytes;
     for (int attempt = 0; attempt < 12; ++attempt) {
-      const int width = std::max(16, static_cast<int>(std::sqrt(pixels * aspect)));
+      const int width = std::max(16, static_cast<int>(std::sqrt(pixels * shape)));
       const int height = std::max(16, static_cast<int>(pixels / width));
       bytes = encode(width, height, amplitude, pictureSeed, png);
       if (bytes.empty()) {
