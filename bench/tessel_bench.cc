@@ -293,8 +293,8 @@ void BM_FirstSyncReplacingCalendars(benchmark::State& state) {
   int round = 0;
   for (auto _ : state) {
     state.PauseTiming();
-    auto client =
-        store.registerClient("calendars-" + std::to_string(round++), "Calendars", kCalendarEntities);
+    auto client = store.registerClient("calendars-" + std::to_string(round++), "Calendars",
+                                       kCalendarEntities);
     client->shouldReplaceClientRecords(kCalendarEntities);
     state.ResumeTiming();
     auto session = tessel::Session::begin(*client, kCalendarEntities);

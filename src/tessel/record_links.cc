@@ -124,7 +124,8 @@ void LinkIndexer::flush() {
     const std::size_t bound = rows == kRowsPerStatement ? rows : 1;
     for (std::size_t row = 0; row < bound; ++row) {
       const auto& [target, source] = pending_[next + row];
-      insert.bind(static_cast<int>(2 * row + 1), target).bind(static_cast<int>(2 * row + 2), source);
+      insert.bind(static_cast<int>(2 * row + 1), target)
+          .bind(static_cast<int>(2 * row + 2), source);
     }
     insert.run();
     next += bound;
