@@ -124,6 +124,38 @@ TEST_F(SessionChanges, OnlyAcceptedChangesAreCommittedAndTheOthersComeBack) {
   EXPECT_EQ(syncAll(), (std::vector<std::string>{"A:c1", "A:c3"}));
 }
 
+TEST_F(SessionChanges, ChangesWithoutRecordsAndAcceptedInOneCallCommitTheSame) {
+  std::vector<Record> records;
+  std::vector<std::string> accepted{"not a change"};
+  for (int i = 0; i < 300; ++i) {
+    records.push_back(contact("c" + std::to_string(i), "Ann"));
+    if (i != 7) accepted.push_back("c" + std::to_string(i));
+  }
+  store_->putRecords(records);
+  store_->putRecords({contact("c0", "Anne")});  // c0 changed last
+  {
+    auto session = Session::begin(*client_, kContacts);
+    session->prepareToPullChanges(kContacts);
+    const std::vector<Change> full = drain(*session, kContacts);
+    std::vector<Change> lean;
+    ChangeEnumerator enumerator = session->changeEnumerator(kContacts, ChangeRecords::Omitted);
+    while (auto change = enumerator.next()) {
+      EXPECT_FALSE(change->record);
+      lean.push_back(std::move(*change));
+    }
+    EXPECT_EQ(summary(lean), summary(full));
+    EXPECT_EQ(summary(full).back(), "A:c0");
+    session->clientAcceptedChangesOf(accepted);
+    session->clientCommittedAcceptedChanges();
+    session->finishSyncing();
+  }
+  EXPECT_EQ(client_->mirrorSize(), 299u);
+  EXPECT_EQ(syncAll(), (std::vector<std::string>{"A:c7"}));
+  store_->deleteRecords({"c1", "c2"});
+  EXPECT_EQ(syncAll(), (std::vector<std::string>{"D:c1", "D:c2"}));
+  EXPECT_EQ(client_->mirrorSize(), 298u);
+}
+
 TEST_F(SessionChanges, CancelDropsAcceptancesThatWereNotCommitted) {
   store_->putRecords({contact("c1", "Ann"), contact("c2", "Bob")});
   {
