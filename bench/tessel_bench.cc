@@ -277,7 +277,7 @@ void BM_WholeSession(benchmark::State& state) {
   const auto count = static_cast<std::size_t>(state.range(0));
   const bool lean = state.range(1) != 0;
   tessel::Store& store = stores().withRecords(count);
-  int round = 0;
+  static int round = 0;  // a new client in every run of every case
   for (auto _ : state) {
     state.PauseTiming();
     auto client = store.registerClient("whole-" + std::to_string(round++), "Whole", kContacts);
@@ -314,7 +314,7 @@ BENCHMARK(BM_WholeSession)
 void BM_FirstSyncReplacingCalendars(benchmark::State& state) {
   const auto count = static_cast<std::size_t>(state.range(0));
   tessel::Store& store = stores().withEvents(count);
-  int round = 0;
+  static int round = 0;  // a new client in every run of every case
   for (auto _ : state) {
     state.PauseTiming();
     auto client = store.registerClient("calendars-" + std::to_string(round++), "Calendars",

@@ -120,7 +120,10 @@ Database::Database(std::filesystem::path path, StoreOpening opening) : path_(std
 }
 
 std::unique_ptr<Connection> Database::openReader() const {
-  return std::make_unique<Connection>(path_, FileCreation::Forbidden);
+  auto reader = std::make_unique<Connection>(path_, FileCreation::Forbidden);
+  // Reads of large stores take pages straight from the mapped file instead of copying each.
+  reader->execute("PRAGMA mmap_size = 268435456");
+  return reader;
 }
 
 int Database::schemaVersion() {
