@@ -36,9 +36,6 @@ Connection::Connection(const std::filesystem::path& path, FileCreation creation)
     execute("PRAGMA synchronous = NORMAL");
     // Large temporary sort and change tables go to files, keeping memory bounded.
     execute("PRAGMA temp_store = FILE");
-    // Up to 32 MiB of pages: the indexes that writes of a hundred thousand records touch stay
-    // in memory instead of being read again page by page.
-    execute("PRAGMA cache_size = -32768");
   } catch (...) {
     sqlite3_close_v2(db_);
     db_ = nullptr;
