@@ -88,7 +88,7 @@ void Snapshot::forEachRecordWithIdentifiers(const std::vector<std::string>& iden
   wanted.erase(std::unique(wanted.begin(), wanted.end()), wanted.end());
   // A few statement sizes, the last batch padded by repeating its last identifier, so that
   // every batch is one query of a statement prepared once per snapshot.
-  constexpr std::size_t kSizes[] = {1, 4, 16, 64, 256};
+  constexpr std::size_t kSizes[] = {1, 2, 4, 8, 16, 32, 64, 128, 256};
   Record record;
   std::size_t next = 0;
   while (next < wanted.size()) {
