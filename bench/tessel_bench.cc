@@ -15,6 +15,7 @@
 #include "tessel/coder.h"
 #include "tessel/decoder.h"
 #include "tessel/filter_registry.h"
+#include "tessel/record_json.h"
 #include "tessel/schema.h"
 #include "tessel/session.h"
 #include "tessel/store.h"
@@ -26,6 +27,11 @@ using zt::platform::Dictionary;
 using zt::platform::Value;
 
 const std::vector<std::string> kContacts{std::string(tessel::TesselEntity_Contacts_Contact)};
+const std::vector<std::string> kCalendarEntities{
+    std::string(tessel::TesselEntity_Calendars_CalendarOrder),
+    std::string(tessel::TesselEntity_Calendars_Calendar),
+    std::string(tessel::TesselEntity_Calendars_Event)};
+constexpr std::size_t kCalendars = 20;
 
 // Passes every contact but those named "nobody": it must decode and read each record.
 class FirstNameFilter : public tessel::Filtering {
@@ -71,18 +77,14 @@ class BenchStores {
  public:
   ~BenchStores() {
     stores_.clear();
+    named_.clear();
     if (!folder_.empty()) std::filesystem::remove_all(folder_);
   }
 
   tessel::Store& withRecords(std::size_t count) {
     auto found = stores_.find(count);
     if (found != stores_.end()) return *found->second;
-    if (folder_.empty()) {
-      char pattern[] = "/tmp/tessel-bench-XXXXXX";
-      if (!mkdtemp(pattern)) std::abort();
-      folder_ = pattern;
-    }
-    auto store = tessel::Store::open(folder_ / ("truth-" + std::to_string(count) + ".db"));
+    auto store = tessel::Store::open(folder() / ("truth-" + std::to_string(count) + ".db"));
     constexpr std::size_t kBatch = 10000;
     for (std::size_t first = 0; first < count; first += kBatch) {
       std::vector<tessel::Record> batch;
@@ -99,9 +101,108 @@ class BenchStores {
     return result;
   }
 
+  // `events` events spread over 20 calendars, each calendar listing its events, and the
+  // calendar order: what the calendars syncer replaces wholesale on every sync.
+  tessel::Store& withEvents(std::size_t events) {
+    return made("events-" + std::to_string(events), [&](tessel::Store& store) {
+      std::vector<zt::platform::Array> members(kCalendars);
+      std::vector<tessel::Record> batch;
+      for (std::size_t i = 0; i < events; ++i) {
+        std::string calendar = "calendar-" + std::to_string(i % kCalendars);
+        members[i % kCalendars].emplace_back("event-" + std::to_string(i));
+        batch.push_back(tessel::Record{
+            "event-" + std::to_string(i),
+            Dictionary{{std::string(tessel::TesselRecordEntityNameKey),
+                        tessel::TesselEntity_Calendars_Event},
+                       {std::string(tessel::TesselAttribute_Calendars_Event_Summary),
+                        "Meeting " + std::to_string(i)},
+                       {std::string(tessel::TesselRelationship_Calendars_Event_Calendar),
+                        Array{calendar}}}});
+        if (batch.size() == 10000) {
+          store.putRecords(batch);
+          batch.clear();
+        }
+      }
+      std::vector<std::string> order;
+      for (std::size_t c = 0; c < kCalendars; ++c) {
+        order.push_back("calendar-" + std::to_string(c));
+        batch.push_back(tessel::Record{
+            order.back(),
+            Dictionary{{std::string(tessel::TesselRecordEntityNameKey),
+                        tessel::TesselEntity_Calendars_Calendar},
+                       {std::string(tessel::TesselAttribute_Calendars_Calendar_Title),
+                        "Calendar " + std::to_string(c)},
+                       {std::string(tessel::TesselRelationship_Calendars_Calendar_Events),
+                        Value(std::move(members[c]))}}});
+      }
+      store.putRecords(batch);
+      store.setCalendarOrder(order);
+    });
+  }
+
+  // `count` contacts of which one in ten has a photo of 30 to 300 KB.
+  tessel::Store& withPhotos(std::size_t count) {
+    return made(
+        "photos-" + std::to_string(count),
+        [&](tessel::Store& store) {
+          std::vector<tessel::Record> batch;
+          for (std::size_t i = 0; i < count; ++i) {
+            tessel::Record record = contactRecord(i);
+            if (i % 10 == 0) {
+              const std::size_t size = 30 * 1024 + (i * 2654435761U) % (270 * 1024);
+              zt::platform::Data photo(size);
+              for (std::size_t b = 0; b < size; ++b)
+                photo[b] = static_cast<std::uint8_t>(b * 31 + i);
+              record.record.set(std::string(tessel::TesselAttribute_Contacts_Contact_Image),
+                                Value(std::move(photo)));
+            }
+            batch.push_back(std::move(record));
+            if (batch.size() == 1000) {
+              store.putRecords(batch);
+              batch.clear();
+            }
+          }
+          store.putRecords(batch);
+          store.registerClient("plain", "Plain", kContacts);
+        },
+        true);
+  }
+
+  // A fresh, empty store for each call.
+  std::unique_ptr<tessel::Store> empty() {
+    return tessel::Store::open(folder() / ("empty-" + std::to_string(++emptyStores_) + ".db"));
+  }
+
  private:
+  // $TESSEL_BENCH_KEPT names a folder where the photos store stays between runs, so that a
+  // case run alone for its peak memory neither pays for making it nor counts it.
+  template <typename Fill>
+  tessel::Store& made(const std::string& name, Fill fill, bool keepable = false) {
+    auto found = named_.find(name);
+    if (found != named_.end()) return *found->second;
+    const char* kept_folder = keepable ? std::getenv("TESSEL_BENCH_KEPT") : nullptr;
+    const std::filesystem::path path =
+        (kept_folder ? std::filesystem::path(kept_folder) : folder()) / (name + ".db");
+    const bool kept = kept_folder && std::filesystem::exists(path);
+    auto store = tessel::Store::open(path);
+    if (!kept) fill(*store);
+    auto& result = *store;
+    named_.emplace(name, std::move(store));
+    return result;
+  }
+  const std::filesystem::path& folder() {
+    if (folder_.empty()) {
+      char pattern[] = "/tmp/tessel-bench-XXXXXX";
+      if (!mkdtemp(pattern)) std::abort();
+      folder_ = pattern;
+    }
+    return folder_;
+  }
+
   std::filesystem::path folder_;
   std::map<std::size_t, std::unique_ptr<tessel::Store>> stores_;
+  std::map<std::string, std::unique_ptr<tessel::Store>> named_;
+  int emptyStores_ = 0;
 };
 
 BenchStores& stores() {
@@ -170,29 +271,154 @@ BENCHMARK(BM_PrepareChanges)
 
 // A whole first sync: prepare, enumerate every record, accept and commit all of it. Each
 // iteration syncs a new client, registered outside the timing, whose mirror starts empty.
+// With the second argument set, the records are left out of the changes and the changes
+// accepted in one call, as a client that only needs to know what changed can.
 void BM_WholeSession(benchmark::State& state) {
   const auto count = static_cast<std::size_t>(state.range(0));
+  const bool lean = state.range(1) != 0;
   tessel::Store& store = stores().withRecords(count);
-  int round = 0;
+  static int round = 0;  // a new client in every run of every case
   for (auto _ : state) {
     state.PauseTiming();
     auto client = store.registerClient("whole-" + std::to_string(round++), "Whole", kContacts);
     state.ResumeTiming();
     auto session = tessel::Session::begin(*client, kContacts);
     session->prepareToPullChanges(kContacts);
-    auto changes = session->changeEnumerator(kContacts);
-    std::size_t seen = 0;
+    auto changes = session->changeEnumerator(
+        kContacts, lean ? tessel::ChangeRecords::Omitted : tessel::ChangeRecords::Decoded);
+    std::vector<std::string> accepted;
     while (auto change = changes.next()) {
-      session->clientAcceptedChanges(change->recordIdentifier);
-      ++seen;
+      if (lean) {
+        accepted.push_back(std::move(change->recordIdentifier));
+      } else {
+        session->clientAcceptedChanges(change->recordIdentifier);
+        accepted.emplace_back();
+      }
     }
+    if (lean) session->clientAcceptedChangesOf(accepted);
     session->clientCommittedAcceptedChanges();
     session->finishSyncing();
-    if (seen != count) state.SkipWithError("not every record was offered");
+    if (accepted.size() != count) state.SkipWithError("not every record was offered");
   }
   state.SetItemsProcessed(static_cast<std::int64_t>(state.iterations() * count));
 }
-BENCHMARK(BM_WholeSession)->Arg(100000)->Unit(benchmark::kMillisecond)->Iterations(3);
+BENCHMARK(BM_WholeSession)
+    ->Args({100000, 0})
+    ->Args({100000, 1})
+    ->ArgNames({"records", "lean"})
+    ->Unit(benchmark::kMillisecond)
+    ->Iterations(3);
+
+// The calendars syncer's first sync: every calendar entity is replaced wholesale; the syncer
+// enumerates only the calendar order (and calendars) and reads events through the snapshot.
+void BM_FirstSyncReplacingCalendars(benchmark::State& state) {
+  const auto count = static_cast<std::size_t>(state.range(0));
+  tessel::Store& store = stores().withEvents(count);
+  static int round = 0;  // a new client in every run of every case
+  for (auto _ : state) {
+    state.PauseTiming();
+    auto client = store.registerClient("calendars-" + std::to_string(round++), "Calendars",
+                                       kCalendarEntities);
+    client->shouldReplaceClientRecords(kCalendarEntities);
+    state.ResumeTiming();
+    auto session = tessel::Session::begin(*client, kCalendarEntities);
+    session->prepareToPullChanges(kCalendarEntities);
+    std::size_t seen = 0;
+    for (const std::string& entity : {std::string(tessel::TesselEntity_Calendars_CalendarOrder),
+                                      std::string(tessel::TesselEntity_Calendars_Calendar)}) {
+      auto changes = session->changeEnumerator({entity});
+      while (auto change = changes.next()) {
+        session->clientAcceptedChanges(change->recordIdentifier);
+        ++seen;
+      }
+    }
+    session->clientCommittedAcceptedChanges();
+    session->finishSyncing();
+    if (seen != kCalendars + 1) state.SkipWithError("not every calendar was offered");
+  }
+  state.SetItemsProcessed(static_cast<std::int64_t>(state.iterations() * count));
+}
+BENCHMARK(BM_FirstSyncReplacingCalendars)
+    ->Arg(100000)
+    ->Unit(benchmark::kMillisecond)
+    ->Iterations(3);
+
+// `tessel records put`: typed JSON lines parsed and written to a fresh store, in batches of
+// `count` small records.
+void BM_PutRecordLines(benchmark::State& state) {
+  const auto count = static_cast<std::size_t>(state.range(0));
+  std::string lines;
+  for (std::size_t i = 0; i < count; ++i) {
+    tessel::Record record = contactRecord(i);
+    lines += tessel::recordToJsonLine(record.id, record.record);
+    lines += '\n';
+  }
+  for (auto _ : state) {
+    state.PauseTiming();
+    auto store = stores().empty();
+    state.ResumeTiming();
+    const std::size_t written = store->putRecords(tessel::parseRecordLines(lines));
+    if (written != count) state.SkipWithError("not every record was written");
+  }
+  state.SetItemsProcessed(static_cast<std::int64_t>(state.iterations() * count));
+}
+BENCHMARK(BM_PutRecordLines)->Arg(100000)->Unit(benchmark::kMillisecond)->Iterations(3);
+
+// The contacts step's read of every contact, photos included, as one map. Run it alone
+// (--benchmark_filter) to read its peak resident memory.
+void BM_ContactsWithPhotosMap(benchmark::State& state) {
+  const auto count = static_cast<std::size_t>(state.range(0));
+  tessel::Store& store = stores().withPhotos(count);
+  auto client = store.clientWithIdentifier("plain");
+  auto snapshot = store.snapshotOfRecordsInTruth(kContacts, *client);
+  Dictionary criteria{
+      {std::string(tessel::TesselRecordEntityNameKey), tessel::TesselEntity_Contacts_Contact}};
+  for (auto _ : state) {
+    std::size_t names = 0;
+    for (const auto& [identifier, record] : snapshot->recordsMatchingAttributes(criteria)) {
+      names += record.find(tessel::TesselAttribute_Contacts_Contact_FirstName) != nullptr;
+    }
+    if (names != count) state.SkipWithError("not every contact was read");
+  }
+  state.SetItemsProcessed(static_cast<std::int64_t>(state.iterations() * count));
+}
+BENCHMARK(BM_ContactsWithPhotosMap)->Arg(50000)->Unit(benchmark::kMillisecond)->Iterations(2);
+
+// The same read, one contact at a time; with the second argument set, photos are left out.
+void BM_ContactsWithPhotosStreamed(benchmark::State& state) {
+  const auto count = static_cast<std::size_t>(state.range(0));
+  const bool photosApart = state.range(1) != 0;
+  tessel::Store& store = stores().withPhotos(count);
+  auto client = store.clientWithIdentifier("plain");
+  auto snapshot = store.snapshotOfRecordsInTruth(kContacts, *client);
+  Dictionary criteria{
+      {std::string(tessel::TesselRecordEntityNameKey), tessel::TesselEntity_Contacts_Contact}};
+  const std::string image(tessel::TesselAttribute_Contacts_Contact_Image);
+  std::vector<std::string> omitted;
+  if (photosApart) omitted.push_back(image);
+  for (auto _ : state) {
+    std::size_t names = 0;
+    std::size_t photoBytes = 0;
+    snapshot->forEachRecordMatching(
+        criteria,
+        [&](tessel::Record& record) {
+          names +=
+              record.record.find(tessel::TesselAttribute_Contacts_Contact_FirstName) != nullptr;
+          const Value* photo = record.record.find(image);
+          if (photo && photo->asData()) photoBytes += photo->asData()->size();
+        },
+        omitted);
+    if (names != count) state.SkipWithError("not every contact was read");
+    benchmark::DoNotOptimize(photoBytes);
+  }
+  state.SetItemsProcessed(static_cast<std::int64_t>(state.iterations() * count));
+}
+BENCHMARK(BM_ContactsWithPhotosStreamed)
+    ->Args({50000, 0})
+    ->Args({50000, 1})
+    ->ArgNames({"contacts", "photos_apart"})
+    ->Unit(benchmark::kMillisecond)
+    ->Iterations(2);
 
 }  // namespace
 

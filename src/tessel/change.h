@@ -9,6 +9,9 @@ namespace tessel {
 
 enum class ChangeType { Add = 1, Modify = 2, Delete = 3 };
 
+// Whether an enumerator hands out the changed records or only what changed.
+enum class ChangeRecords { Decoded, Omitted };
+
 // One change that a session offers its client.
 struct Change {
   ChangeType type;

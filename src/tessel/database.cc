@@ -116,10 +116,15 @@ Database::Database(std::filesystem::path path, StoreOpening opening) : path_(std
   }
   writer_ = std::make_unique<Connection>(
       path_, opening == StoreOpening::MustExist ? FileCreation::Forbidden : FileCreation::Allowed);
+  // Up to 32 MiB of pages: the indexes that a write of a hundred thousand records touches stay
+  // in memory instead of being read again page by page.
+  writer_->execute("PRAGMA cache_size = -32768");
   migrate();
 }
 
 std::unique_ptr<Connection> Database::openReader() const {
+  // No memory mapping here: mapped pages count in the resident memory of a process that
+  // streams a large store, and measured no faster than SQLite's own reads.
   return std::make_unique<Connection>(path_, FileCreation::Forbidden);
 }
 

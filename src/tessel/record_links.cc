@@ -72,28 +72,66 @@ std::int64_t identifierHash(std::string_view identifier) {
 
 }  // namespace
 
-std::vector<std::string> namedIdentifiers(std::string_view entity, const Dictionary& record) {
-  std::vector<std::string> named;
+LinkIndexer::LinkIndexer(Connection& connection) : connection_(connection) {
+  auto& largest = connection_.cached("SELECT max(key) FROM records");
+  StatementReset reset(largest);
+  if (largest.step() && !largest.isNull(0)) largestOldKey_ = largest.integer(0);
+}
+
+void LinkIndexer::forget(std::int64_t key) {
+  if (!touched_.insert(key).second) {
+    // Written twice in one transaction: the first version's entries may still wait.
+    std::erase_if(pending_, [key](const auto& link) { return link.second == key; });
+  }
+  if (key <= largestOldKey_) {
+    connection_.cached("DELETE FROM record_links WHERE source = ?").bind(1, key).run();
+  }
+}
+
+void LinkIndexer::written(std::int64_t key, std::string_view entity, const Dictionary& record) {
+  forget(key);
   const auto* keys = relationshipKeysOf(entity);
-  if (!keys) return named;
-  for (std::string_view key : *keys) {
-    const Value* value = record.find(key);
+  if (!keys) return;
+  for (std::string_view relationship : *keys) {
+    const Value* value = record.find(relationship);
     const Array* identifiers = value ? value->asArray() : nullptr;
     if (!identifiers) continue;
     for (const Value& identifier : *identifiers) {
-      if (const std::string* text = identifier.asString()) named.push_back(*text);
+      if (const std::string* text = identifier.asString()) {
+        pending_.emplace_back(identifierHash(*text), key);
+      }
     }
   }
-  return named;
 }
 
-void indexLinks(Connection& connection, std::int64_t key, const std::vector<std::string>& named) {
-  connection.cached("DELETE FROM record_links WHERE source = ?").bind(1, key).run();
-  auto& insert =
-      connection.cached("INSERT OR IGNORE INTO record_links(target, source) VALUES (?, ?)");
-  for (const std::string& identifier : named) {
-    insert.bind(1, identifierHash(identifier)).bind(2, key).run();
+void LinkIndexer::deleted(std::int64_t key) {
+  forget(key);
+}
+
+void LinkIndexer::flush() {
+  constexpr std::size_t kRowsPerStatement = 100;
+  std::sort(pending_.begin(), pending_.end());
+  pending_.erase(std::unique(pending_.begin(), pending_.end()), pending_.end());
+  std::string many = "INSERT OR IGNORE INTO record_links(target, source) VALUES (?, ?)";
+  for (std::size_t i = 1; i < kRowsPerStatement; ++i) many += ", (?, ?)";
+  std::size_t next = 0;
+  while (next < pending_.size()) {
+    const std::size_t rows = std::min(kRowsPerStatement, pending_.size() - next);
+    Statement& insert = connection_.cached(
+        rows == kRowsPerStatement
+            ? std::string_view(many)
+            : std::string_view("INSERT OR IGNORE INTO record_links(target, source) VALUES (?, ?)"));
+    const std::size_t bound = rows == kRowsPerStatement ? rows : 1;
+    for (std::size_t row = 0; row < bound; ++row) {
+      const auto& [target, source] = pending_[next + row];
+      insert.bind(static_cast<int>(2 * row + 1), target)
+          .bind(static_cast<int>(2 * row + 2), source);
+    }
+    insert.run();
+    next += bound;
   }
+  pending_.clear();
+  touched_.clear();
 }
 
 std::vector<Record> recordsWithoutLinksTo(Connection& connection,
@@ -144,13 +182,17 @@ std::vector<Record> recordsWithoutLinksTo(Connection& connection,
 }
 
 void indexEveryRecord(Connection& connection) {
-  auto& all = connection.cached("SELECT key, entity, data FROM records WHERE deleted = 0");
-  StatementReset reset(all);
-  while (all.step()) {
-    std::string_view entity = all.text(1);
-    if (!relationshipKeysOf(entity)) continue;
-    indexLinks(connection, all.integer(0), namedIdentifiers(entity, decodeRecord(all.blob(2))));
+  LinkIndexer indexer(connection);
+  {
+    auto& all = connection.cached("SELECT key, entity, data FROM records WHERE deleted = 0");
+    StatementReset reset(all);
+    while (all.step()) {
+      std::string_view entity = all.text(1);
+      if (!relationshipKeysOf(entity)) continue;
+      indexer.written(all.integer(0), entity, decodeRecord(all.blob(2)));
+    }
   }
+  indexer.flush();
 }
 
 }  // namespace tessel::detail

@@ -3,6 +3,8 @@
 #include <cstdint>
 #include <string>
 #include <string_view>
+#include <unordered_set>
+#include <utility>
 #include <vector>
 
 #include "platform/value.h"
@@ -15,14 +17,31 @@ namespace tessel::detail {
 // kept in the record_links table by every write. Deleting a record looks up the records that
 // name it there instead of reading the whole truth.
 
-// The identifiers `record`, of `entity`, names in its relationships; records of entities
-// without relationships name none.
-std::vector<std::string> namedIdentifiers(std::string_view entity,
-                                          const zt::platform::Dictionary& record);
+// Keeps the index up to date for the records written in one transaction. Entries of records
+// written for the first time are gathered and inserted sorted, many rows per statement, by
+// flush(), which must run before anything reads the index; the old entries of records written
+// again are dropped at once.
+class LinkIndexer {
+ public:
+  // Records whose keys are above the largest key stored now are new: they have no entries.
+  explicit LinkIndexer(Connection& connection);
+  LinkIndexer(const LinkIndexer&) = delete;
+  LinkIndexer& operator=(const LinkIndexer&) = delete;
 
-// Replaces the index entries of the record stored under `key` by the identifiers it names now
-// (none for a record just deleted).
-void indexLinks(Connection& connection, std::int64_t key, const std::vector<std::string>& named);
+  // The record stored under `key`, of `entity`, was written with these contents.
+  void written(std::int64_t key, std::string_view entity, const zt::platform::Dictionary& record);
+  // The record stored under `key` was deleted: it names no one.
+  void deleted(std::int64_t key);
+  void flush();
+
+ private:
+  void forget(std::int64_t key);
+  Connection& connection_;
+  std::int64_t largestOldKey_ = 0;
+  // (target, source) pairs waiting for flush().
+  std::vector<std::pair<std::int64_t, std::int64_t>> pending_;
+  std::unordered_set<std::int64_t> touched_;
+};
 
 // The live records whose relationships name any of `removed`, each with those identifiers
 // taken out (a relationship left empty goes, as importers leave an empty one out), in

@@ -349,14 +349,18 @@ void Session::prepareToPullChanges(const std::vector<std::string>& entityNames) 
   }
 }
 
-ChangeEnumerator Session::changeEnumerator(const std::vector<std::string>& entityNames) {
+ChangeEnumerator Session::changeEnumerator(const std::vector<std::string>& entityNames,
+                                           ChangeRecords records) {
   state_->ensureRunning();
+  const std::string conditions = "WHERE c.committed = 0 AND c.type <> 4 AND c.entity IN (" +
+                                 placeholders(entityNames.size(), 1) + ") ORDER BY c.seq";
   auto statement = std::make_unique<Statement>(
       state_->view->connection(),
-      "SELECT c.type, c.record_id, c.entity, r.data FROM temp.changes c "
-      "LEFT JOIN main.records r ON r.key = c.record_key AND c.type <> 3 "
-      "WHERE c.committed = 0 AND c.type <> 4 AND c.entity IN (" +
-          placeholders(entityNames.size(), 1) + ") ORDER BY c.seq");
+      records == ChangeRecords::Decoded
+          ? "SELECT c.type, c.record_id, c.entity, r.data FROM temp.changes c "
+            "LEFT JOIN main.records r ON r.key = c.record_key AND c.type <> 3 " +
+                conditions
+          : "SELECT c.type, c.record_id, c.entity, NULL FROM temp.changes c " + conditions);
   for (std::size_t i = 0; i < entityNames.size(); ++i) {
     statement->bind(static_cast<int>(i) + 1, entityNames[i]);
   }
@@ -371,6 +375,24 @@ void Session::clientAcceptedChanges(std::string_view recordIdentifier) {
       .run();
 }
 
+void Session::clientAcceptedChangesOf(const std::vector<std::string>& recordIdentifiers) {
+  state_->ensureRunning();
+  constexpr std::size_t kBatch = 256;
+  detail::Connection& connection = state_->view->connection();
+  for (std::size_t next = 0; next < recordIdentifiers.size(); next += kBatch) {
+    const std::size_t taken = std::min(kBatch, recordIdentifiers.size() - next);
+    // Short batches are padded by repeating their last identifier: one statement serves all.
+    const std::size_t size = taken == kBatch || taken > 16 ? kBatch : (taken > 1 ? 16 : 1);
+    Statement& accept = connection.cached(
+        "UPDATE temp.changes SET accepted = 1 WHERE committed = 0 AND record_id IN (" +
+        placeholders(size, 1) + ")");
+    for (std::size_t i = 0; i < size; ++i) {
+      accept.bind(static_cast<int>(i) + 1, recordIdentifiers[next + std::min(i, taken - 1)]);
+    }
+    accept.run();
+  }
+}
+
 void Session::clientCommittedAcceptedChanges() {
   state_->ensureRunning();
   detail::Connection& writer = state_->database->writer();
@@ -382,27 +404,71 @@ void Session::clientCommittedAcceptedChanges() {
       state_->phase = detail::SessionState::Phase::CancelSeen;
       state_->ensureRunning();
     }
-    auto& upsert = writer.cached(
-        "INSERT INTO mirror(client_id, record_id, entity, generation) VALUES (?, ?, ?, ?) "
-        "ON CONFLICT(client_id, record_id) DO UPDATE SET entity = excluded.entity, "
-        "generation = excluded.generation");
-    auto& forget = writer.cached("DELETE FROM mirror WHERE client_id = ? AND record_id = ?");
-    auto& accepted = view.cached(
-        "SELECT record_id, entity, type, generation FROM temp.changes "
-        "WHERE accepted = 1 AND committed = 0 ORDER BY seq");
-    StatementReset reset(accepted);
-    while (accepted.step()) {
-      std::int64_t type = accepted.integer(2);
-      if (type == kAdd || type == kModify) {
-        upsert.bind(1, state_->clientIdentifier)
-            .bind(2, accepted.text(0))
-            .bind(3, accepted.text(1))
-            .bind(4, accepted.integer(3))
-            .run();
-      } else {
-        forget.bind(1, state_->clientIdentifier).bind(2, accepted.text(0)).run();
+    // The accepted changes go over to the writer's own temporary table in batches, then
+    // reach the mirror in two statements.
+    writer.execute(
+        "CREATE TEMP TABLE IF NOT EXISTS committing("
+        "  record_id TEXT NOT NULL, entity TEXT NOT NULL, generation INTEGER NOT NULL,"
+        "  held INTEGER NOT NULL)");
+    writer.cached("DELETE FROM temp.committing").run();
+    {
+      struct Row {
+        std::string recordId;
+        std::string entity;
+        std::int64_t generation;
+        bool held;
+      };
+      constexpr std::size_t kRows = 100;
+      std::vector<Row> rows;
+      rows.reserve(kRows);
+      std::string many = "INSERT INTO temp.committing VALUES (?, ?, ?, ?)";
+      for (std::size_t i = 1; i < kRows; ++i) many += ", (?, ?, ?, ?)";
+      auto flush = [&] {
+        Statement& insert = writer.cached(
+            rows.size() == kRows
+                ? std::string_view(many)
+                : std::string_view("INSERT INTO temp.committing VALUES (?, ?, ?, ?)"));
+        const std::size_t perStatement = rows.size() == kRows ? kRows : 1;
+        for (std::size_t first = 0; first < rows.size(); first += perStatement) {
+          for (std::size_t i = 0; i < perStatement; ++i) {
+            const Row& row = rows[first + i];
+            const int base = static_cast<int>(4 * i);
+            insert.bind(base + 1, row.recordId)
+                .bind(base + 2, row.entity)
+                .bind(base + 3, row.generation)
+                .bind(base + 4, row.held ? 1 : 0);
+          }
+          insert.run();
+        }
+        rows.clear();
+      };
+      auto& accepted = view.cached(
+          "SELECT record_id, entity, type, generation FROM temp.changes "
+          "WHERE accepted = 1 AND committed = 0 ORDER BY seq");
+      StatementReset reset(accepted);
+      while (accepted.step()) {
+        const std::int64_t type = accepted.integer(2);
+        rows.push_back(Row{std::string(accepted.text(0)), std::string(accepted.text(1)),
+                           accepted.integer(3), type == kAdd || type == kModify});
+        if (rows.size() == kRows) flush();
       }
+      flush();
     }
+    writer
+        .cached(
+            "INSERT INTO main.mirror(client_id, record_id, entity, generation) "
+            "SELECT ?1, record_id, entity, generation FROM temp.committing WHERE held = 1 "
+            "ON CONFLICT(client_id, record_id) DO UPDATE SET entity = excluded.entity, "
+            "generation = excluded.generation")
+        .bind(1, state_->clientIdentifier)
+        .run();
+    writer
+        .cached(
+            "DELETE FROM main.mirror WHERE client_id = ?1 AND record_id IN "
+            "(SELECT record_id FROM temp.committing WHERE held = 0)")
+        .bind(1, state_->clientIdentifier)
+        .run();
+    writer.cached("DELETE FROM temp.committing").run();
     transaction.commit();
   }
   view.cached("UPDATE temp.changes SET committed = 1 WHERE accepted = 1 AND committed = 0").run();

@@ -34,9 +34,14 @@ class Session {
 
   // Compares truth, through the client's filters, with what the client holds.
   void prepareToPullChanges(const std::vector<std::string>& entityNames);
-  ChangeEnumerator changeEnumerator(const std::vector<std::string>& entityNames);
+  // With ChangeRecords::Omitted the changes carry no record (Change::record is none) and the
+  // records are neither read nor decoded: for a client that only needs to know what changed.
+  ChangeEnumerator changeEnumerator(const std::vector<std::string>& entityNames,
+                                    ChangeRecords records = ChangeRecords::Decoded);
   // Marks the prepared change of that record as taken by the client.
   void clientAcceptedChanges(std::string_view recordIdentifier);
+  // The same for many records at once, with one statement per batch of identifiers.
+  void clientAcceptedChangesOf(const std::vector<std::string>& recordIdentifiers);
   // Applies the accepted changes to the client's mirror, in one transaction.
   void clientCommittedAcceptedChanges();
 

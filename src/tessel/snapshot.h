@@ -1,5 +1,6 @@
 #pragma once
 
+#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
@@ -31,6 +32,23 @@ class Snapshot {
   // The records of the identifiers that the view knows; others are left out.
   RecordMap recordsWithIdentifiers(const std::vector<std::string>& identifiers) const;
   std::optional<zt::platform::Dictionary> recordWithIdentifier(std::string_view identifier) const;
+
+  // The records recordsMatchingAttributes(criteria) answers, in the same identifier order, but
+  // handed to `visit` one at a time: only the record being visited is decoded and held. The
+  // attributes named in `omitted` (an image, say) are left out of the visited records; read
+  // them with attributeOfRecord when needed. `visit` may move the record out and may use this
+  // snapshot.
+  void forEachRecordMatching(const zt::platform::Dictionary& criteria,
+                             const std::function<void(Record&)>& visit,
+                             const std::vector<std::string>& omitted = {}) const;
+  // The records recordsWithIdentifiers(identifiers) answers, in identifier order, one at a
+  // time, read with one query per batch of identifiers; `omitted` as above.
+  void forEachRecordWithIdentifiers(const std::vector<std::string>& identifiers,
+                                    const std::function<void(Record&)>& visit,
+                                    const std::vector<std::string>& omitted = {}) const;
+  // One attribute of a record of the view; none when the record is not found or lacks it.
+  std::optional<zt::platform::Value> attributeOfRecord(std::string_view identifier,
+                                                       std::string_view attribute) const;
 
   std::optional<RecordReference> recordReferenceForRecordIdentifier(
       std::string_view identifier) const;

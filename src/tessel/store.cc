@@ -61,6 +61,7 @@ class GenerationCounter {
 std::size_t writeRecords(detail::Connection& writer, const std::vector<Record>& records,
                          const std::vector<std::string>& entities) {
   GenerationCounter generation(writer);
+  detail::LinkIndexer links(writer);
   // The WHERE clause leaves a record that is already stored exactly so untouched, so that
   // writing the same data again offers the clients no change.
   auto& upsert = writer.cached(
@@ -85,11 +86,12 @@ std::size_t writeRecords(detail::Connection& writer, const std::vector<Record>& 
     }
     if (key) {
       ++written;
-      detail::indexLinks(writer, *key, detail::namedIdentifiers(entities[i], records[i].record));
+      links.written(*key, entities[i], records[i].record);
     } else {
       generation.undo();
     }
   }
+  links.flush();
   generation.save();
   return written;
 }
@@ -190,6 +192,7 @@ namespace {
 std::size_t tombstoneRecords(detail::Connection& writer,
                              const std::vector<std::string>& identifiers, MissingRecords missing) {
   GenerationCounter generation(writer);
+  detail::LinkIndexer links(writer);
   auto& tombstone = writer.cached(
       "UPDATE records SET deleted = 1, data = NULL, generation = ? WHERE id = ? AND deleted = 0 "
       "RETURNING key");
@@ -203,7 +206,7 @@ std::size_t tombstoneRecords(detail::Connection& writer,
     }
     if (key) {
       deleted.push_back(identifier);
-      detail::indexLinks(writer, *key, {});  // a deleted record names no one
+      links.deleted(*key);
       continue;
     }
     generation.undo();

@@ -208,8 +208,28 @@ Dictionary ValueReader::dictionary(int depth) {
 }
 
 Dictionary ValueReader::record() {
-  if (byte() != kRecordFormat) corrupt("unknown record format");
+  beginRecord();
   return dictionary(0);
+}
+
+void ValueReader::beginRecord() {
+  if (byte() != kRecordFormat) corrupt("unknown record format");
+}
+
+std::string_view ValueReader::key() {
+  auto bytes = take(count());
+  return {reinterpret_cast<const char*>(bytes.data()), bytes.size()};
+}
+
+void ValueReader::skipValue() {
+  const std::uint8_t tag = byte();
+  if (tag == kString || tag == kUrl || tag == kData) {
+    take(count());
+    return;
+  }
+  // Other values are small or nested: read them whole, which also checks them.
+  --position_;
+  valueAtDepth(1);
 }
 
 Value ValueReader::valueAtDepth(int depth) {
@@ -292,6 +312,29 @@ Dictionary decodeRecord(std::span<const std::uint8_t> bytes) {
   Dictionary record = reader.record();
   if (!reader.atEnd()) corrupt("trailing bytes");
   return record;
+}
+
+Dictionary decodeRecordWithout(std::span<const std::uint8_t> bytes,
+                               const std::vector<std::string>& omitted) {
+  ValueReader reader(bytes);
+  Dictionary record = reader.recordWithout([&](std::string_view key) {
+    for (const std::string& name : omitted) {
+      if (name == key) return true;
+    }
+    return false;
+  });
+  if (!reader.atEnd()) corrupt("trailing bytes");
+  return record;
+}
+
+std::optional<Value> decodeRecordAttribute(std::span<const std::uint8_t> bytes,
+                                           std::string_view attribute) {
+  ValueReader reader(bytes);
+  Dictionary record = reader.recordWithout([&](std::string_view key) { return key != attribute; });
+  if (!reader.atEnd()) corrupt("trailing bytes");
+  Value* value = record.find(attribute);
+  if (!value) return std::nullopt;
+  return std::move(*value);
 }
 
 std::vector<std::uint8_t> encodeValue(const Value& value) {

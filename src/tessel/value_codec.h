@@ -2,6 +2,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <optional>
 #include <span>
 #include <string>
 #include <string_view>
@@ -38,6 +39,12 @@ class ValueReader {
 
   zt::platform::Value value();
   zt::platform::Dictionary record();
+  // A record without the entries whose keys `omit` answers true for; their values are read
+  // past (strings and data without being copied).
+  template <typename Omit>
+  zt::platform::Dictionary recordWithout(const Omit& omit);
+  // Reads past one value.
+  void skipValue();
   std::uint64_t varint();
   std::int64_t signedVarint();
   std::string string();
@@ -46,6 +53,8 @@ class ValueReader {
   std::size_t position() const { return position_; }
 
  private:
+  std::string_view key();
+  void beginRecord();
   zt::platform::Value valueAtDepth(int depth);
   zt::platform::Dictionary dictionary(int depth);
   std::span<const std::uint8_t> take(std::size_t n);
@@ -54,8 +63,32 @@ class ValueReader {
   std::size_t position_ = 0;
 };
 
+template <typename Omit>
+zt::platform::Dictionary ValueReader::recordWithout(const Omit& omit) {
+  beginRecord();
+  std::size_t n = count();
+  zt::platform::Dictionary result;
+  result.reserve(n);
+  for (std::size_t i = 0; i < n; ++i) {
+    std::string_view name = key();
+    if (omit(name)) {
+      skipValue();
+    } else {
+      std::string kept(name);
+      result.set(std::move(kept), valueAtDepth(1));
+    }
+  }
+  return result;
+}
+
 std::vector<std::uint8_t> encodeRecord(const zt::platform::Dictionary& record);
 zt::platform::Dictionary decodeRecord(std::span<const std::uint8_t> bytes);
+// The record without the attributes named in `omitted`.
+zt::platform::Dictionary decodeRecordWithout(std::span<const std::uint8_t> bytes,
+                                             const std::vector<std::string>& omitted);
+// One attribute of a stored record; none when the record has no such key.
+std::optional<zt::platform::Value> decodeRecordAttribute(std::span<const std::uint8_t> bytes,
+                                                         std::string_view attribute);
 std::vector<std::uint8_t> encodeValue(const zt::platform::Value& value);
 zt::platform::Value decodeValue(std::span<const std::uint8_t> bytes);
 

@@ -116,6 +116,38 @@ TEST_F(SessionChanges, OnlyAcceptedChangesAreCommittedAndTheOthersComeBack) {
   EXPECT_EQ(syncAll(), (std::vector<std::string>{"A:c1", "A:c3"}));
 }
 
+TEST_F(SessionChanges, ChangesWithoutRecordsAndAcceptedInOneCallCommitTheSame) {
+  std::vector<Record> records;
+  std::vector<std::string> accepted{"not a change"};
+  for (int i = 0; i < 300; ++i) {
+    records.push_back(contact("c" + std::to_string(i), "Ann"));
+    if (i != 7) accepted.push_back("c" + std::to_string(i));
+  }
+  store_->putRecords(records);
+  store_->putRecords({contact("c0", "Anne")});  // c0 changed last
+  {
+    auto session = Session::begin(*client_, kContacts);
+    session->prepareToPullChanges(kContacts);
+    const std::vector<Change> full = drain(*session, kContacts);
+    std::vector<Change> lean;
+    ChangeEnumerator enumerator = session->changeEnumerator(kContacts, ChangeRecords::Omitted);
+    while (auto change = enumerator.next()) {
+      EXPECT_FALSE(change->record);
+      lean.push_back(std::move(*change));
+    }
+    EXPECT_EQ(summary(lean), summary(full));
+    EXPECT_EQ(summary(full).back(), "A:c0");
+    session->clientAcceptedChangesOf(accepted);
+    session->clientCommittedAcceptedChanges();
+    session->finishSyncing();
+  }
+  EXPECT_EQ(client_->mirrorSize(), 299u);
+  EXPECT_EQ(syncAll(), (std::vector<std::string>{"A:c7"}));
+  store_->deleteRecords({"c1", "c2"});
+  EXPECT_EQ(syncAll(), (std::vector<std::string>{"D:c1", "D:c2"}));
+  EXPECT_EQ(client_->mirrorSize(), 298u);
+}
+
 TEST_F(SessionChanges, CancelDropsAcceptancesThatWereNotCommitted) {
   store_->putRecords({contact("c1", "Ann"), contact("c2", "Bob")});
   {
@@ -160,6 +192,76 @@ TEST_F(SessionChanges, TheSessionSnapshotAnswersRecordsAndReferences) {
   store_->deleteRecords({"c1"});
   EXPECT_FALSE(
       store_->snapshotOfRecordsInTruth({}, *client_)->recordIdentifierForReference(*reference));
+}
+
+TEST_F(SessionChanges, StreamedAndBatchedReadsAnswerWhatTheMapsAnswer) {
+  std::vector<Record> records;
+  std::vector<std::string> identifiers{"nope", "g1"};
+  for (int i = 0; i < 300; ++i) {
+    Record record = contact("c" + std::to_string(i), i % 2 ? "Ann" : "Bob", {"g1"});
+    if (i % 3 == 0) {
+      record.record.set(std::string(TesselAttribute_Contacts_Contact_Image),
+                        Value(zt::platform::Data(1000, static_cast<std::uint8_t>(i))));
+    }
+    records.push_back(std::move(record));
+    identifiers.push_back("c" + std::to_string(299 - i));
+    if (i % 7 == 0) identifiers.push_back("c" + std::to_string(i));  // asked twice
+  }
+  records.push_back(group("g1", "Friends"));
+  store_->putRecords(records);
+  auto session = Session::begin(*client_, {std::string(TesselEntity_Contacts_Contact)});
+  auto snapshot = session->snapshotOfRecordsInTruth();
+  const std::string image(TesselAttribute_Contacts_Contact_Image);
+  auto visited = [](auto&& read) {
+    RecordMap seen;
+    std::string last;
+    read([&](Record& record) {
+      EXPECT_LT(last, record.id);  // identifier order, each once
+      last = record.id;
+      seen.emplace(std::move(record.id), std::move(record.record));
+    });
+    return seen;
+  };
+  auto withoutImages = [&](RecordMap read) {
+    for (auto& [identifier, record] : read) record.erase(image);
+    return read;
+  };
+
+  for (const Dictionary& criteria :
+       {Dictionary{{std::string(TesselRecordEntityNameKey), TesselEntity_Contacts_Contact}},
+        Dictionary{{std::string(TesselAttribute_Contacts_Contact_FirstName), "Ann"}}, Dictionary{},
+        Dictionary{{std::string(TesselRecordEntityNameKey), TesselEntity_Contacts_Group}}}) {
+    const RecordMap expected = snapshot->recordsMatchingAttributes(criteria);
+    EXPECT_EQ(visited([&](auto visit) { snapshot->forEachRecordMatching(criteria, visit); }),
+              expected);
+    EXPECT_EQ(
+        visited([&](auto visit) { snapshot->forEachRecordMatching(criteria, visit, {image}); }),
+        withoutImages(expected));
+  }
+  EXPECT_EQ(snapshot->recordsMatchingAttributes({}).size(), 300u);
+
+  const RecordMap asked = snapshot->recordsWithIdentifiers(identifiers);
+  EXPECT_EQ(asked.size(), 300u);  // the group is outside the view, "nope" unknown
+  EXPECT_EQ(
+      visited([&](auto visit) { snapshot->forEachRecordWithIdentifiers(identifiers, visit); }),
+      asked);
+  EXPECT_EQ(visited([&](auto visit) {
+              snapshot->forEachRecordWithIdentifiers(identifiers, visit, {image});
+            }),
+            withoutImages(asked));
+  EXPECT_EQ(snapshot->recordsWithIdentifiers({"c3"}).size(), 1u);
+
+  // An omitted attribute is still there to be asked for, one record at a time.
+  EXPECT_EQ(snapshot->attributeOfRecord("c3", image),
+            Value(zt::platform::Data(1000, static_cast<std::uint8_t>(3))));
+  EXPECT_FALSE(snapshot->attributeOfRecord("c1", image));
+  EXPECT_FALSE(snapshot->attributeOfRecord("g1", "name"));
+  EXPECT_FALSE(snapshot->attributeOfRecord("nope", image));
+  // And criteria may name it.
+  Dictionary byImage{{image, Value(zt::platform::Data(1000, static_cast<std::uint8_t>(3)))}};
+  EXPECT_EQ(visited([&](auto visit) { snapshot->forEachRecordMatching(byImage, visit, {image}); }),
+            withoutImages(snapshot->recordsMatchingAttributes(byImage)));
+  session->finishSyncing();
 }
 
 }  // namespace
