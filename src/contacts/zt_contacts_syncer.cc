@@ -73,14 +73,23 @@ bool ZTContactsSyncer::getChanges() {
   Log::debug("Getting changes");
   try {
     tessel::Session& session = *_syncManager.syncSession();
-    _contactChangeEnumerator = session.changeEnumerator(sync::ZTSyncManager::entitiesForContacts());
+    // The file is rebuilt whole from truth, so the changes only tell that something changed:
+    // their records are not even read. Every change is accepted, in batches, and becomes final
+    // when the upload commits.
+    _contactChangeEnumerator = session.changeEnumerator(sync::ZTSyncManager::entitiesForContacts(),
+                                                        tessel::ChangeRecords::Omitted);
     _shouldPushFile = false;
-    // The file is rebuilt whole from truth, so the changes only tell that something changed;
-    // each is accepted as it comes, and becomes final when the upload commits.
+    constexpr std::size_t kAcceptBatch = 1024;
+    std::vector<std::string> accepted;
     while (std::optional<tessel::Change> change = _contactChangeEnumerator->next()) {
       _shouldPushFile = true;
-      session.clientAcceptedChanges(change->recordIdentifier);
+      accepted.push_back(std::move(change->recordIdentifier));
+      if (accepted.size() == kAcceptBatch) {
+        session.clientAcceptedChangesOf(accepted);
+        accepted.clear();
+      }
     }
+    if (!accepted.empty()) session.clientAcceptedChangesOf(accepted);
 
     // The first check that asks for a push ends the chain.
     if (_shouldPushFile) {

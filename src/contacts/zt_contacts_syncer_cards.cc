@@ -1,4 +1,6 @@
 // The file image of the contacts: one card per selected contact of truth.
+#include <algorithm>
+#include <cstddef>
 #include <vector>
 
 #include "contacts/vcard_writer.h"
@@ -38,9 +40,11 @@ bool ZTContactsSyncer::disassembleData() {
   _allVCardData.clear();
   try {
     std::shared_ptr<tessel::Snapshot> snapshot = contactTruthSnapshot();
-    const tessel::RecordMap contacts = snapshot->recordsMatchingAttributes(
-        {{tessel::TesselRecordEntityNameKey, std::string(tessel::TesselEntity_Contacts_Contact)}});
-    Log::debug("Truth contains %ul contacts", contacts.size());
+    // The contacts are read a batch at a time, never all at once: with their pictures, a
+    // large address book would not fit in memory.
+    const std::vector<std::string> identifiers =
+        snapshot->recordIdentifiersOfEntity(tessel::TesselEntity_Contacts_Contact);
+    Log::debug("Truth contains %ul contacts", identifiers.size());
 
     VCardWriter writer(*snapshot, [this]() -> ContactPhotoPreparation* {
       return _syncManager.shouldSyncContactImages() ? &ContactPhotoPreparation::shared() : nullptr;
@@ -51,21 +55,21 @@ bool ZTContactsSyncer::disassembleData() {
     bool photosUsed = false;
     // The selected contacts are written a batch at a time, after their pictures have been
     // converted together; the photo setting is asked only once a card is to be written.
-    std::vector<const platform::Dictionary*> batch;
+    std::vector<platform::Dictionary> batch;
     std::vector<const platform::Data*> pictures;
     auto writeBatch = [&]() -> bool {
       if (batch.empty()) return true;
       if (_syncManager.shouldSyncContactImages()) {
         photosUsed = true;
         pictures.clear();
-        for (const platform::Dictionary* contact : batch) {
-          pictures.push_back(contact->dataAt(tessel::TesselAttribute_Contacts_Contact_Image));
+        for (const platform::Dictionary& contact : batch) {
+          pictures.push_back(contact.dataAt(tessel::TesselAttribute_Contacts_Contact_Image));
         }
         ContactPhotoPreparation::shared().prefetch(pictures);
       }
-      for (const platform::Dictionary* contact : batch) {
+      for (const platform::Dictionary& contact : batch) {
         card.clear();
-        writer.appendCard(card, *contact);
+        writer.appendCard(card, contact);
         // One byte-order mark opens the file; the cards follow each other without one.
         if (written == 0) _allVCardData += "\xFE\xFF";
         platform::utf16::appendBigEndian(_allVCardData, card);
@@ -79,12 +83,16 @@ bool ZTContactsSyncer::disassembleData() {
       batch.clear();
       return true;
     };
-    for (const auto& [identifier, contact] : contacts) {
-      if (!isSelected(contact)) continue;
-      batch.push_back(&contact);
-      if (batch.size() == kPhotoBatch && !writeBatch()) return false;
+    for (std::size_t first = 0; first < identifiers.size(); first += kPhotoBatch) {
+      const std::vector<std::string> chunk(
+          identifiers.begin() + static_cast<std::ptrdiff_t>(first),
+          identifiers.begin() +
+              static_cast<std::ptrdiff_t>(std::min(identifiers.size(), first + kPhotoBatch)));
+      snapshot->forEachRecordWithIdentifiers(chunk, [&](tessel::Record& record) {
+        if (isSelected(record.record)) batch.push_back(std::move(record.record));
+      });
+      if (!writeBatch()) return false;
     }
-    if (!writeBatch()) return false;
     // The pictures of this push are all the photo cache keeps.
     if (photosUsed) ContactPhotoPreparation::shared().finishRun();
     Log::debug("Effectively stored %ul contacts on Zeto", written);

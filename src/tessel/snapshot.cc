@@ -38,6 +38,17 @@ RecordMap Snapshot::recordsMatchingAttributes(const zt::platform::Dictionary& cr
   return result;
 }
 
+std::vector<std::string> Snapshot::recordIdentifiersOfEntity(std::string_view entity) const {
+  std::vector<std::string> identifiers;
+  if (!sees(entity)) return identifiers;
+  detail::Statement query(view_->connection(),
+                          "SELECT id FROM records WHERE entity = ? AND deleted = 0");
+  query.bind(1, entity);
+  while (query.step()) identifiers.emplace_back(query.text(0));
+  std::sort(identifiers.begin(), identifiers.end());
+  return identifiers;
+}
+
 void Snapshot::forEachRecordMatching(const zt::platform::Dictionary& criteria,
                                      const std::function<void(Record&)>& visit,
                                      const std::vector<std::string>& omitted) const {

@@ -33,6 +33,9 @@ class Snapshot {
   RecordMap recordsWithIdentifiers(const std::vector<std::string>& identifiers) const;
   std::optional<zt::platform::Dictionary> recordWithIdentifier(std::string_view identifier) const;
 
+  // The identifiers of the view's records of `entity`, in identifier order, read without
+  // decoding any record: a count, or the work list of a caller that reads them in batches.
+  std::vector<std::string> recordIdentifiersOfEntity(std::string_view entity) const;
   // The records recordsMatchingAttributes(criteria) answers, in the same identifier order, but
   // handed to `visit` one at a time: only the record being visited is decoded and held. The
   // attributes named in `omitted` (an image, say) are left out of the visited records; read
