@@ -257,7 +257,10 @@ VCardImportSummary VCardImport::writeTo(Store& store, SyncDeletes syncDeletes) &
   summary.contacts = contactCount();
   summary.groups = groupCount();
   summary.files = files_;
-  std::vector<Record> records = recordsOf(std::move(contacts_), groups());
+  // The groups are read from the contacts before these are moved out: the order in which the
+  // arguments of one call are evaluated is not fixed.
+  const Groups allGroups = groups();
+  std::vector<Record> records = recordsOf(std::move(contacts_), allGroups);
   contacts_.clear();
   contactIndex_.clear();
 
