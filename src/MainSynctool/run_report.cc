@@ -26,9 +26,9 @@ std::map<std::string, FileStamp> stamps(const std::optional<std::string>& folder
   for (const fs::directory_entry& entry : fs::directory_iterator(*folder, error)) {
     struct stat status {};
     if (::lstat(entry.path().c_str(), &status) != 0 || !S_ISREG(status.st_mode)) continue;
-    found.emplace(entry.path().filename().string(),
-                  FileStamp{status.st_ino, status.st_mtim.tv_sec * 1'000'000'000LL +
-                                               status.st_mtim.tv_nsec});
+    found.emplace(
+        entry.path().filename().string(),
+        FileStamp{status.st_ino, status.st_mtim.tv_sec * 1'000'000'000LL + status.st_mtim.tv_nsec});
   }
   return found;
 }
@@ -139,16 +139,17 @@ std::string counted(std::size_t n, std::string_view one, std::string_view many) 
 sync::SyncerMakers reportingMakers(sync::SyncerMakers makers, std::shared_ptr<RunReport> report) {
   sync::SyncerMakers wrapped;
   if (makers.contacts) {
-    wrapped.contacts = [maker = makers.contacts, report](sync::ZTSyncManager& manager)
-        -> std::unique_ptr<sync::ContactsSyncing> {
+    wrapped.contacts = [maker = makers.contacts, report](
+                           sync::ZTSyncManager& manager) -> std::unique_ptr<sync::ContactsSyncing> {
       auto inner = maker(manager);
       if (!inner) return inner;
       return std::make_unique<ReportingContacts>(std::move(inner), manager, report);
     };
   }
   if (makers.calendars) {
-    wrapped.calendars = [maker = makers.calendars, report](sync::ZTSyncManager& manager)
-        -> std::unique_ptr<sync::CalendarsSyncing> {
+    wrapped.calendars =
+        [maker = makers.calendars,
+         report](sync::ZTSyncManager& manager) -> std::unique_ptr<sync::CalendarsSyncing> {
       auto inner = maker(manager);
       if (!inner) return inner;
       return std::make_unique<ReportingCalendars>(std::move(inner), manager, report);

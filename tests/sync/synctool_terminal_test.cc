@@ -49,8 +49,7 @@ TEST_F(OnTerminal, BadArgumentsShowTheUsageAndTheVersionButKeepTheirStatusAndLog
   };
   const std::vector<Case> cases = {
       {"", "usage: zetosynctool --oneshot --sync <sync_client_id>\n"},
-      {"--version",
-       "zetosynctool 38\nusage: zetosynctool --oneshot --sync <sync_client_id>\n"},
+      {"--version", "zetosynctool 38\nusage: zetosynctool --oneshot --sync <sync_client_id>\n"},
   };
   for (const Case& c : cases) {
     SCOPED_TRACE(c.arguments);
@@ -90,10 +89,12 @@ TEST_F(OnTerminal, ARunEndsWithItsOutcomeAndWhatWasWritten) {
     std::string shown;
   };
   const std::vector<Failure> failures = {
-      {"nobody", {Player(std::string(kPlayerID))},
+      {"nobody",
+       {Player(std::string(kPlayerID))},
        "zetosynctool: success, but nothing was written: no sync client nobody in the store " +
            store + "\n"},
-      {std::string(kClientID), {},
+      {std::string(kClientID),
+       {},
        "zetosynctool: player unavailable: no connected player matches " + std::string(kClientID) +
            " (tessel devices lists them), or another sync holds it\n"},
   };
@@ -106,8 +107,7 @@ TEST_F(OnTerminal, ARunEndsWithItsOutcomeAndWhatWasWritten) {
   }
   setEnvironment("TESSEL_STORE", (folder() / "elsewhere.db").string());
   std::tie(status, shown) = runOnTerminal(sync);
-  EXPECT_EQ(shown, "zetosynctool: error: no store at " +
-                       (folder() / "elsewhere.db").string() +
+  EXPECT_EQ(shown, "zetosynctool: error: no store at " + (folder() / "elsewhere.db").string() +
                        " (create it with tessel init, or set TESSEL_STORE)\n");
 }
 

@@ -117,13 +117,26 @@ void addCalendarCommands(CLI::App& app, CommandLine& line) {
   auto calendarIds = std::make_shared<std::vector<std::string>>();
   auto* calendars = app.add_subcommand("calendars", "Calendars");
   calendars->require_subcommand(1);
-  auto* order = calendars->add_subcommand("order", "Set the order of the calendars");
-  order->add_option("ID", *calendarIds, "Calendar identifiers in order")->required();
+  auto* order = calendars->add_subcommand(
+      "order",
+      "Set the order in which the player lists the calendars: these first, then the others "
+      "(it chooses none: that is `client filter ID calendars`)");
+  order->add_option("CALENDAR", *calendarIds, "Calendar titles, unique prefixes or identifiers")
+      ->required();
   order->callback([&line, calendarIds] {
     line.command = [calendarIds](CommandContext& context) {
       orderCalendars(context, *calendarIds);
     };
   });
+  auto* list = calendars->add_subcommand("list", "The calendars in order: identifier and title");
+  list->callback(
+      [&line] { line.command = [](CommandContext& context) { listCalendars(context); }; });
+
+  auto* groups = app.add_subcommand("groups", "Contact groups");
+  groups->require_subcommand(1);
+  auto* groupList = groups->add_subcommand("list", "The contact groups: identifier and name");
+  groupList->callback(
+      [&line] { line.command = [](CommandContext& context) { listGroups(context); }; });
 }
 
 namespace {
@@ -131,7 +144,10 @@ namespace {
 struct ClientOptions {
   std::string clientId;
   bool withContacts = false;
+  bool withoutContacts = false;
   bool withCalendars = false;
+  bool withoutCalendars = false;
+  bool noDataClasses = false;
   std::optional<std::string> clientName;
   std::string settingKey;
   std::string settingValue;
@@ -170,18 +186,37 @@ void addClientCommands(CLI::App& app, CommandLine& line) {
   auto* client = app.add_subcommand("client", "Sync clients");
   client->require_subcommand(1);
 
-  auto* reg = client->add_subcommand("register", "Register a client, or update one");
+  auto* reg = client->add_subcommand(
+      "register",
+      "Register a client, or update one: the data classes not mentioned stay as they are");
   reg->add_option("ID", options->clientId, "Client identifier")->required();
-  reg->add_flag("--contacts", options->withContacts, "Sync contacts");
-  reg->add_flag("--calendars", options->withCalendars, "Sync calendars");
-  reg->add_option("--name", options->clientName, "Display name (default: the identifier)");
+  auto* contacts = reg->add_flag("--contacts", options->withContacts, "Sync contacts");
+  auto* noContacts =
+      reg->add_flag("--no-contacts", options->withoutContacts, "Stop syncing contacts");
+  auto* calendars = reg->add_flag("--calendars", options->withCalendars, "Sync calendars");
+  auto* noCalendars =
+      reg->add_flag("--no-calendars", options->withoutCalendars, "Stop syncing calendars");
+  contacts->excludes(noContacts);
+  calendars->excludes(noCalendars);
+  reg->add_flag("--no-data-classes", options->noDataClasses,
+                "Allow a client that syncs nothing (refused otherwise)");
+  reg->add_option("--name", options->clientName,
+                  "Display name (default: the identifier, or the name it has)");
   reg->callback([&line, options] {
     line.command = [options](CommandContext& context) {
-      registerClient(
-          context, options->clientId, options->withContacts ? ContactsSync::On : ContactsSync::Off,
-          options->withCalendars ? CalendarsSync::On : CalendarsSync::Off, options->clientName);
+      const auto change = [](bool on, bool off) {
+        return on ? DataClassChange::On : off ? DataClassChange::Off : DataClassChange::Keep;
+      };
+      registerClient(context, options->clientId,
+                     change(options->withContacts, options->withoutContacts),
+                     change(options->withCalendars, options->withoutCalendars),
+                     options->noDataClasses ? EmptyClient::Allowed : EmptyClient::Refused,
+                     options->clientName);
     };
   });
+
+  auto* list = client->add_subcommand("list", "The clients: identifier, name, data classes");
+  list->callback([&line] { line.command = [](CommandContext& context) { listClients(context); }; });
 
   auto* show = client->add_subcommand("show", "Settings, filters, mirror size and last session");
   show->add_option("ID", options->clientId, "Client identifier")->required();
@@ -214,10 +249,13 @@ void addClientCommands(CLI::App& app, CommandLine& line) {
   auto* filter = client->add_subcommand("filter", "Choose what goes to the client's player");
   filter->add_option("ID", options->clientId, "Client identifier")->required();
   filter->require_subcommand(1);
-  addFilterCommand(*filter, line, options, "contacts", FilterDataClass::Contacts, "--groups",
-                   "Only the members of these contact groups (identifiers, comma-separated)");
-  addFilterCommand(*filter, line, options, "calendars", FilterDataClass::Calendars, "--calendars",
-                   "Only these calendars (identifiers, comma-separated)");
+  addFilterCommand(
+      *filter, line, options, "contacts", FilterDataClass::Contacts, "--groups",
+      "Only the members of these contact groups (names, unique prefixes or identifiers, "
+      "comma-separated)");
+  addFilterCommand(
+      *filter, line, options, "calendars", FilterDataClass::Calendars, "--calendars",
+      "Only these calendars (titles, unique prefixes or identifiers, comma-separated)");
 }
 
 void addSessionCommands(CLI::App& app, CommandLine& line) {

@@ -5,6 +5,7 @@
 #include <cmath>
 #include <csignal>
 #include <cstdio>
+#include <filesystem>
 #include <iomanip>
 #include <map>
 #include <ostream>
@@ -15,6 +16,7 @@
 #include "platform/notification_listener.h"
 #include "platform/sync_progress.h"
 #include "platform/terminal.h"
+#include "tessel/client.h"
 #include "tessel/exception.h"
 
 namespace tessel::cli {
@@ -124,12 +126,22 @@ void listDevices(CommandContext& context) {
     context.out() << "no Zeto player is connected\n";
     return;
   }
+  // Whether each suggested client is registered; without a store, none is.
+  std::error_code error;
+  Store* store = std::filesystem::exists(context.storePath(), error) ? &context.store() : nullptr;
   for (zt::platform::ZetoRef device : connected) {
     std::uint64_t id = devices->ZetoGetUniqueID(device);
     std::string mountPoint;
     bool mounted = devices->ZetoCopyMountpoint(device, mountPoint) == zt::platform::kZetoSuccess;
+    const std::string client = suggestedClientIdentifier(id);
     context.out() << hexIdentifier(id) << '\t' << (mounted ? mountPoint : "not mounted") << '\t'
-                  << "client: " << suggestedClientIdentifier(id) << '\n';
+                  << "client: " << client << '\t';
+    if (store != nullptr && store->clientWithIdentifier(client)) {
+      context.out() << "registered\n";
+    } else {
+      context.out() << "not registered: tessel client register " << client
+                    << " --contacts --calendars\n";
+    }
   }
 }
 
