@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "tools/tessel/client_commands.h"
+#include "tools/tessel/defaults_commands.h"
 #include "tools/tessel/device_commands.h"
 #include "tools/tessel/filter_commands.h"
 #include "tools/tessel/import_ical_command.h"
@@ -224,7 +225,17 @@ void addClientCommands(CLI::App& app, CommandLine& line) {
     line.command = [options](CommandContext& context) { showClient(context, options->clientId); };
   });
 
-  auto* set = client->add_subcommand("set", "Set a client setting");
+  std::string settingsHelp =
+      "Set a client setting. The settings zetosynctool reads:\n"
+      "  SyncContactPicturesEnabled  false leaves contact photos off the player (default: "
+      "true when the player says it takes them)\n"
+      "  LastModDateForVCF           when the tool last wrote Contacts/Tessel.vcf; it rewrites "
+      "the file when the player's copy is newer or missing\n"
+      "  DidSyncContactImages        whether that file carries photos; a change of the photo "
+      "choice rewrites it\n"
+      "  LastSyncToolVersion         the tool version of the last sync; another version "
+      "rebuilds the client's filters";
+  auto* set = client->add_subcommand("set", settingsHelp);
   set->add_option("ID", options->clientId, "Client identifier")->required();
   set->add_option("KEY", options->settingKey, "Setting key")->required();
   set->add_option("VALUE", options->settingValue,
@@ -256,6 +267,41 @@ void addClientCommands(CLI::App& app, CommandLine& line) {
   addFilterCommand(
       *filter, line, options, "calendars", FilterDataClass::Calendars, "--calendars",
       "Only these calendars (titles, unique prefixes or identifiers, comma-separated)");
+}
+
+void addDefaultsCommands(CLI::App& app, CommandLine& line) {
+  struct Options {
+    std::string key;
+    std::string value;
+  };
+  auto options = std::make_shared<Options>();
+  std::string help = "zetosynctool's own defaults ($ZETOSYNCTOOL_DEFAULTS, else "
+                     "$XDG_CONFIG_HOME/zetosynctool/defaults.conf):";
+  for (const ToolDefault& known : kToolDefaults) {
+    help += std::string("\n  ") + known.key + ": " + known.effect;
+  }
+  auto* defaults = app.add_subcommand("defaults", help);
+  defaults->callback([&line, defaults] {
+    if (defaults->get_subcommands().empty()) {
+      line.command = [](CommandContext& context) { showDefaults(context); };
+    }
+  });
+  auto* set = defaults->add_subcommand("set", "Set one default to true or false");
+  set->add_option("KEY", options->key, "DebugLog, AlwaysSyncContactImages or AlwaysPushVCard")
+      ->required();
+  set->add_option("VALUE", options->value, "true or false")->required();
+  set->callback([&line, options] {
+    line.command = [options](CommandContext& context) {
+      setDefault(context, options->key, options->value);
+    };
+  });
+  auto* unset = defaults->add_subcommand("unset", "Remove one default (it is then false)");
+  unset->add_option("KEY", options->key, "The key")->required();
+  unset->callback([&line, options] {
+    line.command = [options](CommandContext& context) {
+      setDefault(context, options->key, std::nullopt);
+    };
+  });
 }
 
 void addSessionCommands(CLI::App& app, CommandLine& line) {
