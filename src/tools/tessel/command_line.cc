@@ -275,8 +275,9 @@ void addDefaultsCommands(CLI::App& app, CommandLine& line) {
     std::string value;
   };
   auto options = std::make_shared<Options>();
-  std::string help = "zetosynctool's own defaults ($ZETOSYNCTOOL_DEFAULTS, else "
-                     "$XDG_CONFIG_HOME/zetosynctool/defaults.conf):";
+  std::string help =
+      "zetosynctool's own defaults ($ZETOSYNCTOOL_DEFAULTS, else "
+      "$XDG_CONFIG_HOME/zetosynctool/defaults.conf):";
   for (const ToolDefault& known : kToolDefaults) {
     help += std::string("\n  ") + known.key + ": " + known.effect;
   }

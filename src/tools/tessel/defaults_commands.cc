@@ -30,7 +30,8 @@ std::string trimmed(std::string_view text) {
 
 std::string knownKeys() {
   std::string keys;
-  for (const ToolDefault& known : kToolDefaults) keys += (keys.empty() ? "" : ", ") + std::string(known.key);
+  for (const ToolDefault& known : kToolDefaults)
+    keys += (keys.empty() ? "" : ", ") + std::string(known.key);
   return keys;
 }
 

@@ -6,15 +6,15 @@
 #include <csignal>
 #include <cstdio>
 #include <cstdlib>
-#include <fstream>
-#include <iostream>
-#include <nlohmann/json.hpp>
-#include <thread>
 #include <filesystem>
+#include <fstream>
 #include <iomanip>
+#include <iostream>
 #include <map>
+#include <nlohmann/json.hpp>
 #include <ostream>
 #include <sstream>
+#include <thread>
 #include <vector>
 
 #include "platform/device_library.h"
@@ -156,7 +156,9 @@ namespace {
 class Watch {
  public:
   Watch(std::ostream& out, const std::optional<std::string>& client)
-      : out_(out), client_(client), live_(zt::platform::isTerminal(zt::platform::StandardStream::Output)) {}
+      : out_(out),
+        client_(client),
+        live_(zt::platform::isTerminal(zt::platform::StandardStream::Output)) {}
 
   // Shows one notification; answers the exit status once the watched client's sync ended.
   std::optional<int> show(const std::string& name, const std::string& sender,
@@ -213,11 +215,42 @@ zt::platform::Dictionary payloadFromJson(const nlohmann::json& info) {
   return payload;
 }
 
-// Without a session bus: the lines appended to the notifications log from now on.
-int followLog(const std::filesystem::path& path, Watch& watch) {
+bool isSyncNote(const nlohmann::json& note) {
+  return note.is_object() && note.contains("name") && note["name"].is_string() &&
+         note.contains("object") && note["object"].is_string();
+}
+
+// Where following starts: the end of the file, or for one client whose sync is under way (it
+// began and has not ended), the start of that sync, so a watch started just after the tool
+// misses nothing.
+std::uintmax_t followingStart(const std::filesystem::path& path,
+                              const std::optional<std::string>& client) {
+  std::ifstream in(path, std::ios::binary);
   std::uintmax_t offset = 0;
+  std::optional<std::uintmax_t> running;
+  for (std::string line; std::getline(in, line);) {
+    const std::uintmax_t start = offset;
+    offset += line.size() + 1;
+    if (!client || in.eof()) continue;
+    const nlohmann::json note = nlohmann::json::parse(line, nullptr, false);
+    if (!isSyncNote(note) || note["object"] != *client) continue;
+    const nlohmann::json info = note.value("userInfo", nlohmann::json::object());
+    if (info.contains(std::string(zt::platform::sync_progress::kStatusKey))) {
+      running.reset();
+    } else if (!running) {
+      running = start;
+    }
+  }
   std::error_code error;
-  if (std::filesystem::exists(path, error)) offset = std::filesystem::file_size(path, error);
+  const std::uintmax_t size = std::filesystem::file_size(path, error);
+  return running && !error ? *running : error ? 0 : size;
+}
+
+// Without a session bus: the lines appended to the notifications log from now on.
+int followLog(const std::filesystem::path& path, const std::optional<std::string>& client,
+              Watch& watch) {
+  std::error_code error;
+  std::uintmax_t offset = std::filesystem::exists(path, error) ? followingStart(path, client) : 0;
   std::string pending;
   while (!interrupted) {
     const std::uintmax_t size = std::filesystem::file_size(path, error);
@@ -237,13 +270,10 @@ int followLog(const std::filesystem::path& path, Watch& watch) {
       const std::string line = pending.substr(0, end);
       pending.erase(0, end + 1);
       const nlohmann::json note = nlohmann::json::parse(line, nullptr, false);
-      if (!note.is_object() || !note.contains("name") || !note["name"].is_string() ||
-          !note.contains("object") || !note["object"].is_string()) {
-        continue;
-      }
-      if (auto status = watch.show(note["name"].get<std::string>(),
-                                   note["object"].get<std::string>(),
-                                   payloadFromJson(note.value("userInfo", nlohmann::json())))) {
+      if (!isSyncNote(note)) continue;
+      if (auto status =
+              watch.show(note["name"].get<std::string>(), note["object"].get<std::string>(),
+                         payloadFromJson(note.value("userInfo", nlohmann::json())))) {
         return *status;
       }
     }
@@ -270,7 +300,7 @@ int watchSyncs(CommandContext& context, const std::optional<std::string>& client
                       "watch)");
     }
     std::cerr << "tessel: no session bus; following " << log << '\n';
-    return followLog(log, watch);
+    return followLog(log, clientIdentifier, watch);
   }
   while (!interrupted) {
     std::optional<zt::platform::Notification> posted =

@@ -57,7 +57,8 @@ std::string describeSelection(const std::vector<NamedRecord>& records,
   for (const std::string& id : identifiers) {
     std::string shown = id;
     for (const NamedRecord& record : records) {
-      if (record.id == id) shown = (record.name.empty() ? "(untitled)" : record.name) + " (" + id + ")";
+      if (record.id == id)
+        shown = (record.name.empty() ? "(untitled)" : record.name) + " (" + id + ")";
     }
     text += (text.empty() ? "" : ", ") + shown;
   }

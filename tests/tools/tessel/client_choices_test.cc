@@ -3,7 +3,6 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
-
 #include <string>
 #include <vector>
 
@@ -21,10 +20,10 @@ class ClientChoices : public TesselCommandTest {
   void SetUp() override {
     TesselCommandTest::SetUp();
     ASSERT_EQ(tessel({"init"}).status, 0);
-    ASSERT_EQ(tessel({"import", "vcard", (kSamples / "contacts" / "friends-and-colleagues.vcf")
-                                             .string()})
-                  .status,
-              0);
+    ASSERT_EQ(
+        tessel({"import", "vcard", (kSamples / "contacts" / "friends-and-colleagues.vcf").string()})
+            .status,
+        0);
     // Calendars of truth with known identifiers, as another source would put them.
     std::string lines;
     for (const auto& [id, title] : std::vector<std::pair<std::string, std::string>>{
@@ -114,7 +113,8 @@ TEST_F(ClientChoices, FiltersTakeNamesAndShowThem) {
     const char* says;
   } cases[] = {
       {{"contacts", "--groups", "Fam,Book club"}, 0, "syncs 2 contact group(s)"},
-      {{"contacts", "--groups", "F"}, 2,
+      {{"contacts", "--groups", "F"},
+       2,
        "\"F\" names more than one contact group: Family (vcard-group/Family), Friends "
        "(vcard-group/Friends)"},
       {{"contacts", "--groups", "Nobody"}, 2, "\"Nobody\" is not a contact group"},
@@ -130,9 +130,10 @@ TEST_F(ClientChoices, FiltersTakeNamesAndShowThem) {
     EXPECT_CONTAINS(run.out + run.err, c.says);
   }
   const std::string shown = tessel({"client", "show", "c"}).out;
-  EXPECT_CONTAINS(shown, "filters:\n  contacts: the members of Family (vcard-group/Family), "
-                         "Book club (vcard-group/Book club)\n  calendars: Work (ical-work), "
-                         "Home (ical-home)\n");
+  EXPECT_CONTAINS(shown,
+                  "filters:\n  contacts: the members of Family (vcard-group/Family), "
+                  "Book club (vcard-group/Book club)\n  calendars: Work (ical-work), "
+                  "Home (ical-home)\n");
 }
 
 }  // namespace
