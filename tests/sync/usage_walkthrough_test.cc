@@ -109,8 +109,9 @@ TEST_F(UsageWalkthrough, EveryCommandOfThePageRunsAndThePlayerEndsUpSynced) {
                                "\tclient: zeto-A27001A2B3C4D\tnot registered: tessel client "
                                "register zeto-A27001A2B3C4D --contacts --calendars\n");
   EXPECT_CONTAINS(run.out, "zeto-A27001A2B3C4D\tMy Zeto\tcontacts, calendars\n");
-  EXPECT_CONTAINS(run.out, "  contacts: the members of Family (vcard-group/Family), Friends "
-                           "(vcard-group/Friends)\n");
+  EXPECT_CONTAINS(run.out,
+                  "  contacts: the members of Family (vcard-group/Family), Friends "
+                  "(vcard-group/Friends)\n");
   // tessel watch followed the notifications file to the end of the sync.
   EXPECT_CONTAINS(run.err, "tessel: no session bus; following ");
   EXPECT_CONTAINS(run.out, "zeto-A27001A2B3C4D [##############################] 100.0% done");
