@@ -2,6 +2,7 @@
 
 #include <sys/stat.h>
 
+#include <cstdio>
 #include <map>
 #include <string_view>
 #include <system_error>
