@@ -1,11 +1,13 @@
 #include "MainSynctool/synctool_entry.h"
 
 #include <cstdio>
+#include <cstdlib>
 #include <cstring>
 #include <filesystem>
 #include <memory>
 #include <optional>
 #include <string>
+#include <string_view>
 
 #include "MainSynctool/run_report.h"
 #include "calendars/zt_calendars_syncer.h"
@@ -78,7 +80,12 @@ RunFacts factsAfter(const ZTSyncManager& manager, const std::filesystem::path& s
 
 void usage() {
   Log::always("zetosynctool --oneshot --sync <sync_client_id>");
-  if (onTerminal()) tellTerminal("usage: zetosynctool --oneshot --sync <sync_client_id>");
+  // With the log on standard error, the line is already there.
+  const char* log = std::getenv("ZETOSYNCTOOL_LOG");
+  const bool logOnTerminal = log != nullptr && std::string_view(log) == "stderr";
+  if (onTerminal() && !logOnTerminal) {
+    tellTerminal("usage: zetosynctool --oneshot --sync <sync_client_id>");
+  }
 }
 
 int synctoolMain(int argc, const char* const argv[]) {
