@@ -160,7 +160,7 @@ void mergeCalendar(ICalCalendar& calendar, const RecordMap& before, SyncDeletes 
   written.shrink_to_fit();
 }
 
-// The order keeps the calendars it lists that still exist, then the new ones.
+// The order keeps the calendars it lists that still exist, then the new ones, then any other.
 std::vector<std::string> calendarOrder(const std::vector<std::string>& order,
                                        const std::set<std::string>& liveCalendars,
                                        const std::vector<ICalCalendar>& calendars) {
@@ -175,6 +175,10 @@ std::vector<std::string> calendarOrder(const std::vector<std::string>& order,
     if (std::find(newOrder.begin(), newOrder.end(), calendar.identifier) == newOrder.end()) {
       newOrder.push_back(calendar.identifier);
     }
+  }
+  // Every calendar of truth is listed: those the order left out come last.
+  for (const std::string& id : liveCalendars) {
+    if (std::find(newOrder.begin(), newOrder.end(), id) == newOrder.end()) newOrder.push_back(id);
   }
   return newOrder;
 }

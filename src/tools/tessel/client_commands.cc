@@ -1,5 +1,6 @@
 #include "tools/tessel/client_commands.h"
 
+#include <algorithm>
 #include <chrono>
 #include <ctime>
 #include <memory>
@@ -8,9 +9,13 @@
 #include <string_view>
 #include <vector>
 
+#include "filters/zeto_calendar_filter.h"
+#include "filters/zeto_contact_filter.h"
 #include "tessel/client.h"
 #include "tessel/exception.h"
 #include "tessel/schema.h"
+#include "tessel/snapshot.h"
+#include "tools/tessel/record_names.h"
 #include "tools/tessel/setting_value.h"
 #include "tools/tessel/usage_error.h"
 
@@ -64,24 +69,89 @@ std::string_view outcomeName(SessionOutcome outcome) {
   return "unknown";
 }
 
+// A filter as a person reads it: what it lets through, by name.
+std::string filterSelection(CommandContext& context, Client& client, const Filtering& filter) {
+  const auto* contacts = dynamic_cast<const zt::filters::ZetoContactFilter*>(&filter);
+  const auto* calendars = dynamic_cast<const zt::filters::ZetoCalendarFilter*>(&filter);
+  if (contacts == nullptr && calendars == nullptr) {
+    return filter.className() + ": " + filter.description();
+  }
+  const bool all = contacts ? contacts->useAllContacts() : calendars->useAllCalendars();
+  std::string line = contacts ? "contacts: " : "calendars: ";
+  if (all) return line + (contacts ? "all contacts" : "all calendars");
+  Store& store = context.store();
+  const std::shared_ptr<Snapshot> snapshot = store.snapshotOfRecordsInTruth(
+      {std::string(contacts ? TesselEntity_Contacts_Group : TesselEntity_Calendars_Calendar)},
+      client);
+  const std::vector<std::string> ids = contacts
+                                           ? contacts->usedContactGroupIDsForSnapshot(*snapshot)
+                                           : calendars->usedCalendarGroupIDsForSnapshot(*snapshot);
+  const std::vector<NamedRecord> known =
+      namedRecords(store, contacts ? NamedEntity::ContactGroup : NamedEntity::Calendar);
+  if (ids.empty()) return line + "none (what it named is gone)";
+  return line + (contacts ? "the members of " : "") + describeSelection(known, ids);
+}
+
 }  // namespace
 
-void registerClient(CommandContext& context, const std::string& identifier, ContactsSync contacts,
-                    CalendarsSync calendars, const std::optional<std::string>& displayName) {
+void registerClient(CommandContext& context, const std::string& identifier,
+                    DataClassChange contacts, DataClassChange calendars, EmptyClient empty,
+                    const std::optional<std::string>& displayName) {
   if (identifier.empty()) throw UsageError("a client identifier cannot be empty");
+  Store& store = context.store();
+  const std::unique_ptr<Client> existing = store.clientWithIdentifier(identifier);
+  const auto enabled = [&existing](std::string_view firstEntity) {
+    if (!existing) return false;
+    const std::vector<std::string> names = existing->enabledEntityNames();
+    return std::find(names.begin(), names.end(), firstEntity) != names.end();
+  };
+  const auto decide = [](DataClassChange change, bool before) {
+    return change == DataClassChange::Keep ? before : change == DataClassChange::On;
+  };
+  const bool withContacts = decide(contacts, enabled(kContactsEntities.front()));
+  const bool withCalendars = decide(calendars, enabled(kCalendarsEntities.front()));
+  if (!withContacts && !withCalendars && empty == EmptyClient::Refused) {
+    throw UsageError("client " + identifier +
+                     " would sync nothing: say --contacts and/or --calendars (or "
+                     "--no-data-classes for a client of no data class)");
+  }
   std::vector<std::string> entities;
-  if (contacts == ContactsSync::On)
+  if (withContacts)
     entities.insert(entities.end(), kContactsEntities.begin(), kContactsEntities.end());
-  if (calendars == CalendarsSync::On)
+  if (withCalendars)
     entities.insert(entities.end(), kCalendarsEntities.begin(), kCalendarsEntities.end());
-  context.store().registerClient(identifier, displayName.value_or(identifier), entities);
-  context.out() << "client " << identifier << " registered for "
-                << (entities.empty() ? "no data class"
-                    : contacts == ContactsSync::On && calendars == CalendarsSync::On
-                        ? "contacts and calendars"
-                    : contacts == ContactsSync::On ? "contacts"
-                                                   : "calendars")
+  const std::string name = displayName ? *displayName
+                           : existing  ? existing->displayName()
+                                       : identifier;
+  store.registerClient(identifier, name, entities);
+  context.out() << "client " << identifier << (existing ? " updated" : " registered") << " for "
+                << (entities.empty()                ? "no data class"
+                    : withContacts && withCalendars ? "contacts and calendars"
+                    : withContacts                  ? "contacts"
+                                                    : "calendars")
                 << '\n';
+}
+
+void listClients(CommandContext& context) {
+  Store& store = context.store();
+  const std::vector<std::string> identifiers = store.clientIdentifiers();
+  if (identifiers.empty()) context.out() << "no clients (tessel devices suggests one)\n";
+  for (const std::string& identifier : identifiers) {
+    const std::unique_ptr<Client> client = store.clientWithIdentifier(identifier);
+    if (!client) continue;
+    const std::vector<std::string> names = client->enabledEntityNames();
+    const auto has = [&names](std::string_view entity) {
+      return std::find(names.begin(), names.end(), entity) != names.end();
+    };
+    const bool contacts = has(kContactsEntities.front());
+    const bool calendars = has(kCalendarsEntities.front());
+    context.out() << identifier << '\t' << client->displayName() << '\t'
+                  << (contacts && calendars ? "contacts, calendars"
+                      : contacts            ? "contacts"
+                      : calendars           ? "calendars"
+                                            : "no data class")
+                  << '\n';
+  }
 }
 
 void showClient(CommandContext& context, const std::string& identifier) {
@@ -104,9 +174,8 @@ void showClient(CommandContext& context, const std::string& identifier) {
 
   const FilterList filters = client->filters();
   out << "filters:" << (filters.empty() ? " none" : "") << '\n';
-  for (const auto& filter : filters) {
-    out << "  " << filter->className() << ": " << filter->description() << '\n';
-  }
+  for (const auto& filter : filters)
+    out << "  " << filterSelection(context, *client, *filter) << '\n';
 
   out << "mirror: " << client->mirrorSize() << " records\n";
 

@@ -24,6 +24,9 @@ class CommandContext {
   std::ostream& out() const { return out_; }
 
  private:
+  // On standard error, when --store names a store that zetosynctool will not read.
+  void warnIfToolReadsAnotherStore(const std::filesystem::path& path) const;
+
   std::optional<std::filesystem::path> storePath_;
   std::istream& in_;
   std::ostream& out_;

@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "tools/tessel/client_commands.h"
+#include "tools/tessel/defaults_commands.h"
 #include "tools/tessel/device_commands.h"
 #include "tools/tessel/filter_commands.h"
 #include "tools/tessel/import_ical_command.h"
@@ -117,13 +118,26 @@ void addCalendarCommands(CLI::App& app, CommandLine& line) {
   auto calendarIds = std::make_shared<std::vector<std::string>>();
   auto* calendars = app.add_subcommand("calendars", "Calendars");
   calendars->require_subcommand(1);
-  auto* order = calendars->add_subcommand("order", "Set the order of the calendars");
-  order->add_option("ID", *calendarIds, "Calendar identifiers in order")->required();
+  auto* order = calendars->add_subcommand(
+      "order",
+      "Set the order in which the player lists the calendars: these first, then the others "
+      "(it chooses none: that is `client filter ID calendars`)");
+  order->add_option("CALENDAR", *calendarIds, "Calendar titles, unique prefixes or identifiers")
+      ->required();
   order->callback([&line, calendarIds] {
     line.command = [calendarIds](CommandContext& context) {
       orderCalendars(context, *calendarIds);
     };
   });
+  auto* list = calendars->add_subcommand("list", "The calendars in order: identifier and title");
+  list->callback(
+      [&line] { line.command = [](CommandContext& context) { listCalendars(context); }; });
+
+  auto* groups = app.add_subcommand("groups", "Contact groups");
+  groups->require_subcommand(1);
+  auto* groupList = groups->add_subcommand("list", "The contact groups: identifier and name");
+  groupList->callback(
+      [&line] { line.command = [](CommandContext& context) { listGroups(context); }; });
 }
 
 namespace {
@@ -131,7 +145,10 @@ namespace {
 struct ClientOptions {
   std::string clientId;
   bool withContacts = false;
+  bool withoutContacts = false;
   bool withCalendars = false;
+  bool withoutCalendars = false;
+  bool noDataClasses = false;
   std::optional<std::string> clientName;
   std::string settingKey;
   std::string settingValue;
@@ -170,18 +187,37 @@ void addClientCommands(CLI::App& app, CommandLine& line) {
   auto* client = app.add_subcommand("client", "Sync clients");
   client->require_subcommand(1);
 
-  auto* reg = client->add_subcommand("register", "Register a client, or update one");
+  auto* reg = client->add_subcommand(
+      "register",
+      "Register a client, or update one: the data classes not mentioned stay as they are");
   reg->add_option("ID", options->clientId, "Client identifier")->required();
-  reg->add_flag("--contacts", options->withContacts, "Sync contacts");
-  reg->add_flag("--calendars", options->withCalendars, "Sync calendars");
-  reg->add_option("--name", options->clientName, "Display name (default: the identifier)");
+  auto* contacts = reg->add_flag("--contacts", options->withContacts, "Sync contacts");
+  auto* noContacts =
+      reg->add_flag("--no-contacts", options->withoutContacts, "Stop syncing contacts");
+  auto* calendars = reg->add_flag("--calendars", options->withCalendars, "Sync calendars");
+  auto* noCalendars =
+      reg->add_flag("--no-calendars", options->withoutCalendars, "Stop syncing calendars");
+  contacts->excludes(noContacts);
+  calendars->excludes(noCalendars);
+  reg->add_flag("--no-data-classes", options->noDataClasses,
+                "Allow a client that syncs nothing (refused otherwise)");
+  reg->add_option("--name", options->clientName,
+                  "Display name (default: the identifier, or the name it has)");
   reg->callback([&line, options] {
     line.command = [options](CommandContext& context) {
-      registerClient(
-          context, options->clientId, options->withContacts ? ContactsSync::On : ContactsSync::Off,
-          options->withCalendars ? CalendarsSync::On : CalendarsSync::Off, options->clientName);
+      const auto change = [](bool on, bool off) {
+        return on ? DataClassChange::On : off ? DataClassChange::Off : DataClassChange::Keep;
+      };
+      registerClient(context, options->clientId,
+                     change(options->withContacts, options->withoutContacts),
+                     change(options->withCalendars, options->withoutCalendars),
+                     options->noDataClasses ? EmptyClient::Allowed : EmptyClient::Refused,
+                     options->clientName);
     };
   });
+
+  auto* list = client->add_subcommand("list", "The clients: identifier, name, data classes");
+  list->callback([&line] { line.command = [](CommandContext& context) { listClients(context); }; });
 
   auto* show = client->add_subcommand("show", "Settings, filters, mirror size and last session");
   show->add_option("ID", options->clientId, "Client identifier")->required();
@@ -189,7 +225,17 @@ void addClientCommands(CLI::App& app, CommandLine& line) {
     line.command = [options](CommandContext& context) { showClient(context, options->clientId); };
   });
 
-  auto* set = client->add_subcommand("set", "Set a client setting");
+  std::string settingsHelp =
+      "Set a client setting. The settings zetosynctool reads:\n"
+      "  SyncContactPicturesEnabled  false leaves contact photos off the player (default: "
+      "true when the player says it takes them)\n"
+      "  LastModDateForVCF           when the tool last wrote Contacts/Tessel.vcf; it rewrites "
+      "the file when the player's copy is newer or missing\n"
+      "  DidSyncContactImages        whether that file carries photos; a change of the photo "
+      "choice rewrites it\n"
+      "  LastSyncToolVersion         the tool version of the last sync; another version "
+      "rebuilds the client's filters";
+  auto* set = client->add_subcommand("set", settingsHelp);
   set->add_option("ID", options->clientId, "Client identifier")->required();
   set->add_option("KEY", options->settingKey, "Setting key")->required();
   set->add_option("VALUE", options->settingValue,
@@ -214,10 +260,49 @@ void addClientCommands(CLI::App& app, CommandLine& line) {
   auto* filter = client->add_subcommand("filter", "Choose what goes to the client's player");
   filter->add_option("ID", options->clientId, "Client identifier")->required();
   filter->require_subcommand(1);
-  addFilterCommand(*filter, line, options, "contacts", FilterDataClass::Contacts, "--groups",
-                   "Only the members of these contact groups (identifiers, comma-separated)");
-  addFilterCommand(*filter, line, options, "calendars", FilterDataClass::Calendars, "--calendars",
-                   "Only these calendars (identifiers, comma-separated)");
+  addFilterCommand(
+      *filter, line, options, "contacts", FilterDataClass::Contacts, "--groups",
+      "Only the members of these contact groups (names, unique prefixes or identifiers, "
+      "comma-separated)");
+  addFilterCommand(
+      *filter, line, options, "calendars", FilterDataClass::Calendars, "--calendars",
+      "Only these calendars (titles, unique prefixes or identifiers, comma-separated)");
+}
+
+void addDefaultsCommands(CLI::App& app, CommandLine& line) {
+  struct Options {
+    std::string key;
+    std::string value;
+  };
+  auto options = std::make_shared<Options>();
+  std::string help =
+      "zetosynctool's own defaults ($ZETOSYNCTOOL_DEFAULTS, else "
+      "$XDG_CONFIG_HOME/zetosynctool/defaults.conf):";
+  for (const ToolDefault& known : kToolDefaults) {
+    help += std::string("\n  ") + known.key + ": " + known.effect;
+  }
+  auto* defaults = app.add_subcommand("defaults", help);
+  defaults->callback([&line, defaults] {
+    if (defaults->get_subcommands().empty()) {
+      line.command = [](CommandContext& context) { showDefaults(context); };
+    }
+  });
+  auto* set = defaults->add_subcommand("set", "Set one default to true or false");
+  set->add_option("KEY", options->key, "DebugLog, AlwaysSyncContactImages or AlwaysPushVCard")
+      ->required();
+  set->add_option("VALUE", options->value, "true or false")->required();
+  set->callback([&line, options] {
+    line.command = [options](CommandContext& context) {
+      setDefault(context, options->key, options->value);
+    };
+  });
+  auto* unset = defaults->add_subcommand("unset", "Remove one default (it is then false)");
+  unset->add_option("KEY", options->key, "The key")->required();
+  unset->callback([&line, options] {
+    line.command = [options](CommandContext& context) {
+      setDefault(context, options->key, std::nullopt);
+    };
+  });
 }
 
 void addSessionCommands(CLI::App& app, CommandLine& line) {

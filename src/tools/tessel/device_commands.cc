@@ -5,16 +5,23 @@
 #include <cmath>
 #include <csignal>
 #include <cstdio>
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
 #include <iomanip>
+#include <iostream>
 #include <map>
+#include <nlohmann/json.hpp>
 #include <ostream>
 #include <sstream>
+#include <thread>
 #include <vector>
 
 #include "platform/device_library.h"
 #include "platform/notification_listener.h"
 #include "platform/sync_progress.h"
 #include "platform/terminal.h"
+#include "tessel/client.h"
 #include "tessel/exception.h"
 
 namespace tessel::cli {
@@ -124,49 +131,184 @@ void listDevices(CommandContext& context) {
     context.out() << "no Zeto player is connected\n";
     return;
   }
+  // Whether each suggested client is registered; without a store, none is.
+  std::error_code error;
+  Store* store = std::filesystem::exists(context.storePath(), error) ? &context.store() : nullptr;
   for (zt::platform::ZetoRef device : connected) {
     std::uint64_t id = devices->ZetoGetUniqueID(device);
     std::string mountPoint;
     bool mounted = devices->ZetoCopyMountpoint(device, mountPoint) == zt::platform::kZetoSuccess;
+    const std::string client = suggestedClientIdentifier(id);
     context.out() << hexIdentifier(id) << '\t' << (mounted ? mountPoint : "not mounted") << '\t'
-                  << "client: " << suggestedClientIdentifier(id) << '\n';
+                  << "client: " << client << '\t';
+    if (store != nullptr && store->clientWithIdentifier(client)) {
+      context.out() << "registered\n";
+    } else {
+      context.out() << "not registered: tessel client register " << client
+                    << " --contacts --calendars\n";
+    }
   }
 }
 
+namespace {
+
+// One watch: the players' bars, drawn as notifications come, from the bus or from the log file.
+class Watch {
+ public:
+  Watch(std::ostream& out, const std::optional<std::string>& client)
+      : out_(out),
+        client_(client),
+        live_(zt::platform::isTerminal(zt::platform::StandardStream::Output)) {}
+
+  // Shows one notification; answers the exit status once the watched client's sync ended.
+  std::optional<int> show(const std::string& name, const std::string& sender,
+                          const zt::platform::Dictionary& info) {
+    if (name != zt::platform::sync_progress::kNotificationName) return std::nullopt;
+    if (client_ && sender != *client_) return std::nullopt;
+    Progress& progress = players_[sender];
+    update(progress, info);
+    // On a terminal each player's bar is redrawn in place; otherwise one line per update.
+    if (live_) {
+      out_ << '\r' << "\x1b[K" << bar(sender, progress);
+      if (progress.status) out_ << '\n';
+    } else {
+      out_ << bar(sender, progress) << '\n';
+    }
+    out_.flush();
+    if (!progress.status) return std::nullopt;
+    const auto status = static_cast<int>(*progress.status);
+    players_.erase(sender);
+    if (client_) return status;
+    return std::nullopt;
+  }
+  void end() {
+    if (live_) out_ << '\n';
+  }
+
+ private:
+  std::ostream& out_;
+  std::optional<std::string> client_;
+  bool live_;
+  std::map<std::string, Progress> players_;
+};
+
+// A notification's payload from its JSON line: the strings, numbers and lists of strings that
+// the progress needs.
+zt::platform::Dictionary payloadFromJson(const nlohmann::json& info) {
+  zt::platform::Dictionary payload;
+  if (!info.is_object()) return payload;
+  for (const auto& [key, value] : info.items()) {
+    if (value.is_string()) {
+      payload.set(key, zt::platform::Value(value.get<std::string>()));
+    } else if (value.is_number_integer()) {
+      payload.set(key, zt::platform::Value::integer(value.get<std::int64_t>()));
+    } else if (value.is_number()) {
+      payload.set(key, zt::platform::Value::real(value.get<double>()));
+    } else if (value.is_array()) {
+      zt::platform::Array names;
+      for (const auto& element : value) {
+        if (element.is_string()) names.emplace_back(element.get<std::string>());
+      }
+      payload.set(key, zt::platform::Value(std::move(names)));
+    }
+  }
+  return payload;
+}
+
+bool isSyncNote(const nlohmann::json& note) {
+  return note.is_object() && note.contains("name") && note["name"].is_string() &&
+         note.contains("object") && note["object"].is_string();
+}
+
+// Where following starts: the end of the file, or for one client whose sync is under way (it
+// began and has not ended), the start of that sync, so a watch started just after the tool
+// misses nothing.
+std::uintmax_t followingStart(const std::filesystem::path& path,
+                              const std::optional<std::string>& client) {
+  std::ifstream in(path, std::ios::binary);
+  std::uintmax_t offset = 0;
+  std::optional<std::uintmax_t> running;
+  for (std::string line; std::getline(in, line);) {
+    const std::uintmax_t start = offset;
+    offset += line.size() + 1;
+    if (!client || in.eof()) continue;
+    const nlohmann::json note = nlohmann::json::parse(line, nullptr, false);
+    if (!isSyncNote(note) || note["object"] != *client) continue;
+    const nlohmann::json info = note.value("userInfo", nlohmann::json::object());
+    if (info.contains(std::string(zt::platform::sync_progress::kStatusKey))) {
+      running.reset();
+    } else if (!running) {
+      running = start;
+    }
+  }
+  std::error_code error;
+  const std::uintmax_t size = std::filesystem::file_size(path, error);
+  return running && !error ? *running : error ? 0 : size;
+}
+
+// Without a session bus: the lines appended to the notifications log from now on.
+int followLog(const std::filesystem::path& path, const std::optional<std::string>& client,
+              Watch& watch) {
+  std::error_code error;
+  std::uintmax_t offset = std::filesystem::exists(path, error) ? followingStart(path, client) : 0;
+  std::string pending;
+  while (!interrupted) {
+    const std::uintmax_t size = std::filesystem::file_size(path, error);
+    if (error || size == offset) {
+      std::this_thread::sleep_for(std::chrono::milliseconds(200));
+      continue;
+    }
+    if (size < offset) offset = 0;  // emptied: read it from its start
+    std::ifstream in(path, std::ios::binary);
+    in.seekg(static_cast<std::streamoff>(offset));
+    std::string chunk(static_cast<std::size_t>(size - offset), '\0');
+    in.read(chunk.data(), static_cast<std::streamsize>(chunk.size()));
+    chunk.resize(static_cast<std::size_t>(in.gcount()));
+    offset += chunk.size();
+    pending += chunk;
+    for (auto end = pending.find('\n'); end != std::string::npos; end = pending.find('\n')) {
+      const std::string line = pending.substr(0, end);
+      pending.erase(0, end + 1);
+      const nlohmann::json note = nlohmann::json::parse(line, nullptr, false);
+      if (!isSyncNote(note)) continue;
+      if (auto status =
+              watch.show(note["name"].get<std::string>(), note["object"].get<std::string>(),
+                         payloadFromJson(note.value("userInfo", nlohmann::json())))) {
+        return *status;
+      }
+    }
+  }
+  watch.end();
+  return 0;
+}
+
+}  // namespace
+
 int watchSyncs(CommandContext& context, const std::optional<std::string>& clientIdentifier) {
+  std::signal(SIGINT, onInterrupt);
+  std::signal(SIGTERM, onInterrupt);
+  Watch watch(context.out(), clientIdentifier);
   std::unique_ptr<zt::platform::NotificationListener> listener =
       zt::platform::NotificationListener::connectToSessionBus();
   if (!listener) {
-    throw Exception(TesselStoreException,
-                    "no session bus to listen on (is DBUS_SESSION_BUS_ADDRESS set?)");
+    const char* log = std::getenv("TESSEL_NOTIFICATIONS_LOG");
+    if (log == nullptr || *log == '\0') {
+      throw Exception(TesselStoreException,
+                      "no session bus to listen on (DBUS_SESSION_BUS_ADDRESS is not set: on a "
+                      "text console or over SSH, run `dbus-run-session -- bash`, or set "
+                      "TESSEL_NOTIFICATIONS_LOG to a file for both zetosynctool and tessel "
+                      "watch)");
+    }
+    std::cerr << "tessel: no session bus; following " << log << '\n';
+    return followLog(log, clientIdentifier, watch);
   }
-  std::signal(SIGINT, onInterrupt);
-  std::signal(SIGTERM, onInterrupt);
-  const bool live = zt::platform::isTerminal(zt::platform::StandardStream::Output);
-  std::map<std::string, Progress> players;
-  std::ostream& out = context.out();
   while (!interrupted) {
     std::optional<zt::platform::Notification> posted =
         listener->next(std::chrono::milliseconds(250));
-    if (!posted || posted->name != zt::platform::sync_progress::kNotificationName) continue;
-    if (clientIdentifier && posted->sender != *clientIdentifier) continue;
-    Progress& progress = players[posted->sender];
-    update(progress, posted->userInfo);
-    // On a terminal each player's bar is redrawn in place; otherwise one line per update.
-    if (live) {
-      out << '\r' << "\x1b[K" << bar(posted->sender, progress);
-      if (progress.status) out << '\n';
-    } else {
-      out << bar(posted->sender, progress) << '\n';
-    }
-    out.flush();
-    if (progress.status) {
-      std::int64_t status = *progress.status;
-      if (clientIdentifier) return static_cast<int>(status);
-      players.erase(posted->sender);
-    }
+    if (!posted) continue;
+    if (auto status = watch.show(posted->name, posted->sender, posted->userInfo)) return *status;
   }
-  if (live) out << '\n';
+  watch.end();
   return 0;
 }
 

@@ -9,6 +9,7 @@
 #include "tessel/exception.h"
 #include "tessel/schema.h"
 #include "tessel/snapshot.h"
+#include "tools/tessel/record_names.h"
 #include "tools/tessel/usage_error.h"
 
 namespace tessel::cli {
@@ -51,21 +52,33 @@ void setClientFilter(CommandContext& context, const std::string& identifier,
   std::shared_ptr<Snapshot> snapshot =
       store.snapshotOfRecordsInTruth({std::string(entity)}, *client);
 
+  // Names and unique prefixes stand for their records.
+  std::optional<std::vector<std::string>> chosen;
+  if (selection) {
+    const std::vector<NamedRecord> known =
+        namedRecords(store, contacts ? NamedEntity::ContactGroup : NamedEntity::Calendar);
+    chosen.emplace();
+    for (const std::string& given : *selection) {
+      chosen->push_back(
+          resolveName(known, given, contacts ? NamedEntity::ContactGroup : NamedEntity::Calendar));
+    }
+  }
+
   std::shared_ptr<Filtering> filter;
   if (contacts) {
     auto contactFilter = std::make_shared<zt::filters::ZetoContactFilter>();
-    if (selection) {
-      checkSelection(*snapshot, *selection, entity, "contact group");
+    if (chosen) {
+      checkSelection(*snapshot, *chosen, entity, "contact group");
       contactFilter->setUseAllContacts(false);
-      contactFilter->setUsedContactGroupIDs(*selection, *snapshot);
+      contactFilter->setUsedContactGroupIDs(*chosen, *snapshot);
     }
     filter = contactFilter;
   } else {
     auto calendarFilter = std::make_shared<zt::filters::ZetoCalendarFilter>();
-    if (selection) {
-      checkSelection(*snapshot, *selection, entity, "calendar");
+    if (chosen) {
+      checkSelection(*snapshot, *chosen, entity, "calendar");
       calendarFilter->setUseAllCalendars(false);
-      calendarFilter->setUsedCalendarGroupIDs(*selection, *snapshot);
+      calendarFilter->setUsedCalendarGroupIDs(*chosen, *snapshot);
     }
     filter = calendarFilter;
   }

@@ -35,6 +35,7 @@ int main(int argc, char** argv) {
   CLI::App app{"The Tessel sync engine's command: its store of records and sync clients.",
                "tessel"};
   app.require_subcommand(1);
+  app.set_version_flag("--version", "tessel " ZT_PROJECT_VERSION);
 
   std::optional<std::string> storePath;
   app.add_option("--store", storePath,
@@ -48,12 +49,15 @@ int main(int argc, char** argv) {
   addClientCommands(app, line);
   addSessionCommands(app, line);
   addDeviceCommands(app, line);
+  addDefaultsCommands(app, line);
 
   try {
     app.parse(argc, argv);
   } catch (const CLI::CallForHelp& e) {
     return app.exit(e);
   } catch (const CLI::CallForAllHelp& e) {
+    return app.exit(e);
+  } catch (const CLI::CallForVersion& e) {
     return app.exit(e);
   } catch (const CLI::ParseError& e) {
     return fail(kUsage, std::string(e.what()) + "\nRun with --help for more information.");

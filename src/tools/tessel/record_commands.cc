@@ -1,5 +1,6 @@
 #include "tools/tessel/record_commands.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <cstring>
 #include <fstream>
@@ -11,9 +12,13 @@
 #include "tessel/record_json.h"
 #include "tessel/schema.h"
 #include "tools/tessel/counted.h"
+#include "tools/tessel/record_names.h"
 #include "tools/tessel/record_summary.h"
+#include "tools/tessel/usage_error.h"
 
 namespace tessel::cli {
+
+using zt::platform::Value;
 
 namespace {
 
@@ -77,10 +82,80 @@ void listRecords(CommandContext& context, const std::optional<std::string>& enti
   if (!out) throw std::runtime_error("cannot write the listing");
 }
 
-void orderCalendars(CommandContext& context, const std::vector<std::string>& calendarIdentifiers) {
-  context.store().setCalendarOrder(calendarIdentifiers);
-  context.out() << "calendar order set: "
-                << counted(calendarIdentifiers.size(), "calendar", "calendars") << '\n';
+void orderCalendars(CommandContext& context, const std::vector<std::string>& calendars) {
+  Store& store = context.store();
+  const std::vector<NamedRecord> known = namedRecords(store, NamedEntity::Calendar);
+  // The named calendars first, then the others in the order they had, then any left out.
+  std::vector<std::string> order;
+  const auto add = [&order](const std::string& id) {
+    if (std::find(order.begin(), order.end(), id) == order.end()) order.push_back(id);
+  };
+  for (const std::string& given : calendars) {
+    const std::string id = resolveName(known, given, NamedEntity::Calendar);
+    if (std::find(order.begin(), order.end(), id) != order.end()) {
+      throw UsageError("calendar \"" + given + "\" is named twice");
+    }
+    order.push_back(id);
+  }
+  store.forEachRecord(
+      [&](const Record& record) {
+        const Value* listed =
+            record.record.find(TesselRelationship_Calendars_CalendarOrder_Calendars);
+        if (listed == nullptr || listed->asArray() == nullptr) return;
+        for (const Value& id : *listed->asArray()) {
+          if (id.asString() == nullptr) continue;
+          for (const NamedRecord& calendar : known) {
+            if (calendar.id == *id.asString()) add(calendar.id);
+          }
+        }
+      },
+      TesselEntity_Calendars_CalendarOrder);
+  for (const NamedRecord& calendar : known) add(calendar.id);
+  store.setCalendarOrder(order);
+  context.out() << "calendar order:";
+  for (const std::string& id : order) {
+    context.out() << (id == order.front() ? " " : ", ") << describeSelection(known, {id});
+  }
+  context.out() << '\n';
+}
+
+void listCalendars(CommandContext& context) {
+  Store& store = context.store();
+  const std::vector<NamedRecord> known = namedRecords(store, NamedEntity::Calendar);
+  std::vector<std::string> listed;
+  store.forEachRecord(
+      [&](const Record& record) {
+        const Value* ids = record.record.find(TesselRelationship_Calendars_CalendarOrder_Calendars);
+        if (ids == nullptr || ids->asArray() == nullptr) return;
+        for (const Value& id : *ids->asArray()) {
+          if (id.asString() != nullptr) listed.push_back(*id.asString());
+        }
+      },
+      TesselEntity_Calendars_CalendarOrder);
+  // In the player's order; calendars the order does not list (yet) at the end.
+  std::vector<const NamedRecord*> shown;
+  for (const std::string& id : listed) {
+    for (const NamedRecord& calendar : known) {
+      if (calendar.id == id) shown.push_back(&calendar);
+    }
+  }
+  for (const NamedRecord& calendar : known) {
+    if (std::find(listed.begin(), listed.end(), calendar.id) == listed.end()) {
+      shown.push_back(&calendar);
+    }
+  }
+  if (shown.empty()) context.out() << "no calendars\n";
+  for (const NamedRecord* calendar : shown) {
+    context.out() << calendar->id << '\t' << calendar->name << '\n';
+  }
+}
+
+void listGroups(CommandContext& context) {
+  const std::vector<NamedRecord> known = namedRecords(context.store(), NamedEntity::ContactGroup);
+  if (known.empty()) context.out() << "no contact groups\n";
+  for (const NamedRecord& group : known) {
+    context.out() << group.id << '\t' << group.name << '\n';
+  }
 }
 
 }  // namespace tessel::cli

@@ -23,7 +23,12 @@ void deleteRecords(CommandContext& context, const std::vector<std::string>& iden
 void listRecords(CommandContext& context, const std::optional<std::string>& entityName,
                  ListFormat format);
 
-// `calendars order ID...`: the store's one CalendarOrder record.
-void orderCalendars(CommandContext& context, const std::vector<std::string>& calendarIdentifiers);
+// `calendars order CALENDAR...`: the store's one CalendarOrder record lists every calendar,
+// the named ones (names, unique prefixes or identifiers) first. It orders; it selects nothing.
+void orderCalendars(CommandContext& context, const std::vector<std::string>& calendars);
+
+// `calendars list` and `groups list`: identifier and name, one a line; calendars in order.
+void listCalendars(CommandContext& context);
+void listGroups(CommandContext& context);
 
 }  // namespace tessel::cli
