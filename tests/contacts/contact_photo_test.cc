@@ -5,9 +5,7 @@
 #include <gtest/gtest.h>
 
 #include <cstring>
-#include <filesystem>
 #include <fstream>
-#include <sstream>
 
 #include "platform/log.h"
 #include "support/captured_log.h"
