@@ -4,10 +4,8 @@
 
 #include <gtest/gtest.h>
 
-#include <filesystem>
 #include <memory>
 #include <string>
-#include <vector>
 
 #include "support/temporary_folder.h"
 #include "tessel/schema.h"

@@ -55,8 +55,7 @@ class ContactsSyncTest : public ::testing::Test {
   SyncOutcome sync(PlayerPhotos photos = PlayerPhotos::Refused, std::string_view defaults = "",
                    SyncerMaker maker = nullptr);
 
-  std::filesystem::path contactsFolder() const { return folder_ / "vol" / "Contacts"; }
-  std::filesystem::path vcfPath() const { return contactsFolder() / "Tessel.vcf"; }
+  std::filesystem::path vcfPath() const { return folder_ / "vol" / "Contacts" / "Tessel.vcf"; }
   std::string fileBytes() const { return zt::test_support::readFile(vcfPath()); }
   // The file's cards as UTF-8 after its byte-order mark, which must be there.
   std::string fileText() const { return zt::test_support::utf8OfUtf16BigEndian(fileBytes()); }

@@ -2,7 +2,6 @@
 // virtual player, a store of its own and the real probe.
 #include <gtest/gtest.h>
 
-#include <memory>
 #include <optional>
 #include <string>
 

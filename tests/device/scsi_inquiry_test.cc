@@ -4,7 +4,6 @@
 
 #include <optional>
 #include <utility>
-#include <vector>
 
 #include "device/checkpoint_data.h"
 #include "device/probe_test_support.h"

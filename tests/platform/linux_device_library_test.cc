@@ -2,8 +2,6 @@
 
 #include <gtest/gtest.h>
 
-#include <string>
-
 #include "platform/linux/unique_id.h"
 
 namespace zt::platform {

@@ -5,7 +5,6 @@
 #include <memory>
 #include <string>
 #include <utility>
-#include <vector>
 
 #include "filters/zeto_calendar_filter.h"
 #include "filters/zeto_contact_filter.h"

@@ -45,53 +45,28 @@ TEST_F(PlayerVolume, AVolumeMountingLateIsAwaitedAndEventsOfAnotherPlayerDoNotEn
 
 // Giving up on a volume that never mounts: sync_manager_test, in process.
 
-TEST_F(PlayerVolume, ARegularFileNamedContactsTurnsContactsOffButNotTheRun) {
-  registerClient(kClientID, true, true);
-  tessel(
-      {"import", "ical",
-       (fs::path(ZT_TEST_DATA_DIR) / ".." / ".." / "samples" / "calendars" / "home.ics").string()});
-  std::ofstream(volume() / "Contacts") << "not a folder";
-  const SynctoolRun run = syncClient(kClientID);
-  EXPECT_EQ(run.exitStatus, 0);
-  EXPECT_TRUE(run.logged("Folder Contacts on Zeto is a regular file, we can't use it to sync"))
-      << run.log;
-  EXPECT_TRUE(fs::is_directory(volume() / "Calendars"));
-  EXPECT_EQ(readFile(volume() / "Contacts"), "not a folder");
-  EXPECT_EQ(run.finalStatus(), 0);
-  // Contacts are off, calendars go on and are written.
-  EXPECT_EQ(run.dataClassesSyncing(), std::vector<std::string>{"tessel.calendars"});
-  EXPECT_FALSE(run.logged("Sync'ing Contacts"));
-  EXPECT_TRUE(run.logged("Sync'ing Calendars")) << run.log;
-  EXPECT_NE(readFile(volume() / "Calendars" / "Tessel-Home.ics").find("BEGIN:VEVENT"),
-            std::string::npos);
-  EXPECT_EQ(client(kClientID)->lastSession()->outcome, tessel::SessionOutcome::Finished);
-
-  // Existing folders are used as they are.
-  fs::remove(volume() / "Contacts");
-  fs::create_directory(volume() / "Contacts");
-  const SynctoolRun again = syncClient(kClientID);
-  EXPECT_EQ(again.finalStatus(), 0);
-  EXPECT_FALSE(again.logContains("Need to create")) << again.log;
-  EXPECT_FALSE(again.logContains("regular file"));
-}
-
 using zt::test_support::namesIn;
 
-TEST_F(PlayerVolume, ALinkInPlaceOfAFolderTurnsItsDataClassOffAndLeadsNowhere) {
+// A regular file, or a link to a folder of the user's as a player formatted on another system
+// may hold: its data class is off, what it leads to untouched, and the other one syncs.
+TEST_F(PlayerVolume, AFileOrLinkInPlaceOfAFolderTurnsItsDataClassOffAndLeadsNowhere) {
   registerClient(kClientID, true, true);
   putRecords({Json::parse(
       R"({"id": "cal-home", "record": {"tessel.record.entity": "tessel.calendars.Calendar", "title": "Home"}})")});
-
-  // A link to a folder of the user's, as a player formatted on another system may hold.
   const fs::path outside = folder() / "outside";
-  for (const std::string linked : {"Contacts", "Calendars"}) {
-    SCOPED_TRACE(linked);
+  for (const auto& [name, link] :
+       {std::pair{"Contacts", false}, std::pair{"Contacts", true}, std::pair{"Calendars", true}}) {
+    const std::string linked = name;
+    SCOPED_TRACE(linked + (link ? " link" : " file"));
     fs::remove_all(volume());
     fs::create_directories(volume());
     fs::remove_all(outside);
     fs::create_directories(outside);
     std::ofstream(outside / "mine.txt") << "the user's";
-    fs::create_directory_symlink(outside, volume() / linked);
+    if (link)
+      fs::create_directory_symlink(outside, volume() / linked);
+    else
+      std::ofstream(volume() / linked) << "not a folder";
 
     const SynctoolRun run = syncClient(kClientID);
 
@@ -102,12 +77,22 @@ TEST_F(PlayerVolume, ALinkInPlaceOfAFolderTurnsItsDataClassOffAndLeadsNowhere) {
         << run.log;
     EXPECT_EQ(namesIn(outside), std::vector<std::string>{"mine.txt"});
     EXPECT_EQ(readFile(outside / "mine.txt"), "the user's");
-    EXPECT_TRUE(fs::is_symlink(volume() / linked));
-    // The other data class syncs as usual.
-    const fs::path other = linked == "Contacts" ? volume() / "Calendars" / "Tessel-Home.ics"
-                                                : volume() / "Contacts" / "Tessel.vcf";
-    EXPECT_TRUE(fs::is_regular_file(other)) << run.log;
+    EXPECT_TRUE(link ? fs::is_symlink(volume() / linked)
+                     : readFile(volume() / linked) == "not a folder");
+    const bool contacts = linked == "Contacts";
+    EXPECT_EQ(run.dataClassesSyncing(),
+              std::vector<std::string>{contacts ? "tessel.calendars" : "tessel.contacts"});
+    EXPECT_TRUE(fs::is_regular_file(contacts ? volume() / "Calendars" / "Tessel-Home.ics"
+                                             : volume() / "Contacts" / "Tessel.vcf"))
+        << run.log;
+    EXPECT_EQ(client(kClientID)->lastSession()->outcome, tessel::SessionOutcome::Finished);
   }
+  // Existing folders are used as they are.
+  fs::remove(volume() / "Calendars");
+  fs::create_directory(volume() / "Calendars");
+  const SynctoolRun again = syncClient(kClientID);
+  EXPECT_EQ(again.finalStatus(), 0);
+  EXPECT_FALSE(again.logContains("Need to create")) << again.log;
 }
 
 TEST_F(PlayerVolume, TemporariesLeftByAnInterruptedWriteAreRemovedByTheNextPush) {

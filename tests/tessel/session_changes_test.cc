@@ -21,9 +21,14 @@ class SessionChanges : public StoreTest {
 
   // One whole session as the tool runs it: prepare, accept each change as it is enumerated,
   // commit, finish.
-  std::vector<std::string> syncAll() {
-    auto session = Session::begin(*client_, kContacts);
+  std::unique_ptr<Session> begin(const Client& client) {
+    auto session = Session::begin(client, kContacts);
     session->prepareToPullChanges(kContacts);
+    return session;
+  }
+
+  std::vector<std::string> syncAll() {
+    auto session = begin(*client_);
     std::vector<Change> changes;
     ChangeEnumerator enumerator = session->changeEnumerator(kContacts);
     while (auto change = enumerator.next()) {
@@ -47,8 +52,7 @@ TEST_F(SessionChanges, AddsModifiesAndDeletesFollowTruthInTheOrderItChanged) {
   store_->putRecords({contact("c1", "Anne")});
   store_->deleteRecords({"c2"});
   store_->putRecords({contact("c3", "Cy")});
-  auto session = Session::begin(*client_, kContacts);
-  session->prepareToPullChanges(kContacts);
+  auto session = begin(*client_);
   auto changes = drain(*session, kContacts);
   EXPECT_EQ(summary(changes), (std::vector<std::string>{"M:c1", "D:c2", "A:c3"}));
   ASSERT_TRUE(changes[0].record);
@@ -94,16 +98,14 @@ TEST_F(SessionChanges, ReplaceModeDeliversEveryPassingRecordAsAnAdd) {
   // session afterwards has nothing to say.
   EXPECT_EQ(client_->mirrorSize(), 2u);
   auto plain = store_->clientWithIdentifier("Z1");
-  auto session = Session::begin(*plain, kContacts);
-  session->prepareToPullChanges(kContacts);
+  auto session = begin(*plain);
   EXPECT_TRUE(drain(*session, kContacts).empty());
 }
 
 TEST_F(SessionChanges, OnlyAcceptedChangesAreCommittedAndTheOthersComeBack) {
   store_->putRecords({contact("c1", "Ann"), contact("c2", "Bob"), contact("c3", "Cy")});
   {
-    auto session = Session::begin(*client_, kContacts);
-    session->prepareToPullChanges(kContacts);
+    auto session = begin(*client_);
     EXPECT_EQ(drain(*session, kContacts).size(), 3u);
     session->clientAcceptedChanges("c2");
     session->clientAcceptedChanges("not a change");
@@ -126,8 +128,7 @@ TEST_F(SessionChanges, ChangesWithoutRecordsAndAcceptedInOneCallCommitTheSame) {
   store_->putRecords(records);
   store_->putRecords({contact("c0", "Anne")});  // c0 changed last
   {
-    auto session = Session::begin(*client_, kContacts);
-    session->prepareToPullChanges(kContacts);
+    auto session = begin(*client_);
     const std::vector<Change> full = drain(*session, kContacts);
     std::vector<Change> lean;
     ChangeEnumerator enumerator = session->changeEnumerator(kContacts, ChangeRecords::Omitted);
@@ -151,8 +152,7 @@ TEST_F(SessionChanges, ChangesWithoutRecordsAndAcceptedInOneCallCommitTheSame) {
 TEST_F(SessionChanges, CancelDropsAcceptancesThatWereNotCommitted) {
   store_->putRecords({contact("c1", "Ann"), contact("c2", "Bob")});
   {
-    auto session = Session::begin(*client_, kContacts);
-    session->prepareToPullChanges(kContacts);
+    auto session = begin(*client_);
     session->clientAcceptedChanges("c1");
     session->clientCommittedAcceptedChanges();
     session->clientAcceptedChanges("c2");

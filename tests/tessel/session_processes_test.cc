@@ -7,6 +7,7 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <iterator>
 #include <sstream>
 
 #include "tessel/exception.h"
@@ -19,16 +20,10 @@ namespace {
 const std::vector<std::string> kContacts{std::string(TesselEntity_Contacts_Contact)};
 constexpr std::size_t kChurnBatch = 2000;
 
-std::vector<std::string> words(const std::string& text) {
-  std::istringstream in(text);
-  std::vector<std::string> result;
-  for (std::string word; in >> word;) result.push_back(word);
-  return result;
-}
-
 // The jobs a helper process can do; the exit status tells the parent how it went.
 int runChildJob(const std::string& job) {
-  auto args = words(job);
+  std::istringstream words(job);
+  const std::vector<std::string> args{std::istream_iterator<std::string>(words), {}};
   auto store = Store::open(args.at(1), StoreOpening::MustExist);
   if (args[0] == "cancel") return store->cancelSession(args.at(2)) ? 0 : 1;
   if (args[0] == "begin") {

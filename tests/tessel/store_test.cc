@@ -159,6 +159,14 @@ std::int64_t generationOf(const std::filesystem::path& store, const std::string&
   return generation;
 }
 
+// Runs `sql` on the store file beside the store.
+void execute(const std::filesystem::path& store, const char* sql) {
+  sqlite3* db = nullptr;
+  ASSERT_EQ(sqlite3_open(store.c_str(), &db), SQLITE_OK);
+  EXPECT_EQ(sqlite3_exec(db, sql, nullptr, nullptr, nullptr), SQLITE_OK);
+  sqlite3_close(db);
+}
+
 TEST_F(StoreRelationships, ADeletedRecordLeavesEveryRelationshipThatNamedIt) {
   store_->putRecords({calendar("k1"), entity("o1", TesselEntity_Calendars_Organizer),
                       entity("a1", TesselEntity_Calendars_Attendee),
@@ -210,12 +218,7 @@ TEST_F(StoreRelationships, AStoreFromBeforeTheIndexIsIndexedWhenOpened) {
   store_->putRecords(
       {entity("o1", TesselEntity_Calendars_Organizer), calendar("k1"), event("e1", "o1", {})});
   store_.reset();
-  sqlite3* db = nullptr;
-  ASSERT_EQ(sqlite3_open(storePath_.c_str(), &db), SQLITE_OK);
-  ASSERT_EQ(sqlite3_exec(db, "DROP TABLE record_links; UPDATE schema_version SET version = 1",
-                         nullptr, nullptr, nullptr),
-            SQLITE_OK);
-  sqlite3_close(db);
+  execute(storePath_, "DROP TABLE record_links; UPDATE schema_version SET version = 1");
 
   store_ = Store::open(storePath_, StoreOpening::MustExist);
   EXPECT_EQ(store_->schemaVersion(), 2);
@@ -246,11 +249,7 @@ TEST_F(StoreFile, IsWalAndRefusesWhatIsNotAStoreOfItsSchema) {
   EXPECT_THROW(Store::open(folder_ / "garbage.db"), Exception);
 
   store_.reset();
-  sqlite3* db = nullptr;
-  ASSERT_EQ(sqlite3_open(storePath_.c_str(), &db), SQLITE_OK);
-  ASSERT_EQ(sqlite3_exec(db, "UPDATE schema_version SET version = 99", nullptr, nullptr, nullptr),
-            SQLITE_OK);
-  sqlite3_close(db);
+  execute(storePath_, "UPDATE schema_version SET version = 99");
   EXPECT_THROW(Store::open(storePath_), Exception);
 }
 
