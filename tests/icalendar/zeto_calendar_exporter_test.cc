@@ -10,6 +10,7 @@
 #include "platform/calendar_date.h"
 #include "platform/time_zone.h"
 #include "platform/value.h"
+#include "support/files.h"
 #include "tessel/schema.h"
 
 namespace zt::icalendar {
@@ -31,11 +32,19 @@ std::string k(std::string_view name) {
   return std::string(name);
 }
 
+TimeZone paris() {
+  return TimeZone::named("Europe/Paris").value();
+}
+
 Dictionary calendar(Array events, Array tasks = {}) {
   return {{k(TesselAttribute_Calendars_Calendar_Title), "Work"},
           {k(TesselEntity_Calendars_CalendarOrder), "1l"},
           {k(TesselEntity_Calendars_Event), std::move(events)},
           {k(TesselEntity_Calendars_Task), std::move(tasks)}};
+}
+
+std::string readGolden(const std::string& name) {
+  return zt::test_support::readFile(std::string(ZT_TEST_DATA_DIR) + "/data/" + name);
 }
 
 class ExporterTest : public testing::Test {
@@ -46,6 +55,26 @@ class ExporterTest : public testing::Test {
 
   ZetoCalendarExporter exporter;
 };
+
+TEST_F(ExporterTest, WorkCalendarMatchesGoldenFile) {
+  const Dictionary alarm{
+      {k(TesselAttribute_Calendars_DisplayAlarm_Description), "Lunch"},
+      {k(TesselAttribute_Calendars_DisplayAlarm_Triggerduration), Value::integer(-900)}};
+  const Dictionary event{
+      {"uid", "abc-1"},
+      {k(TesselAttribute_Calendars_Event_Summary), "Lunch"},
+      {k(TesselAttribute_Calendars_Event_StartDate), at(2007, 3, 15, 12, 30, paris())},
+      {k(TesselAttribute_Calendars_Event_EndDate), at(2007, 3, 15, 13, 30, paris())},
+      {k(TesselEntity_Calendars_DisplayAlarm), Array{alarm}}};
+  const Dictionary record = calendar({event});
+  const Dictionary before = record;
+
+  std::vector<std::uint8_t> buffer{'o', 'l', 'd'};
+  ZetoCalendarExporter::setupData(buffer, record);
+  EXPECT_TRUE(zt::test_support::sameLines(readGolden("work.ics"),
+                                          std::string(buffer.begin(), buffer.end())));
+  EXPECT_EQ(record, before);  // dates were written from copies
+}
 
 // The golden sample sync pins the usual lines (zones, organizers, attendees, rules, exception
 // dates, alarms); these are the edges the samples do not reach.
