@@ -8,7 +8,6 @@ namespace {
 
 using zt::platform::Dictionary;
 using zt::platform::Value;
-using Names = std::vector<std::string>;
 
 const std::vector<std::string> kContacts{std::string(TesselEntity_Contacts_Contact),
                                          std::string(TesselEntity_Contacts_Group)};
@@ -46,7 +45,7 @@ class SessionChanges : public StoreTest {
 
 TEST_F(SessionChanges, AddsModifiesAndDeletesFollowTruthInTheOrderItChanged) {
   store_->putRecords({contact("c2", "Bob"), contact("c1", "Ann"), group("g1", "Friends")});
-  EXPECT_EQ(syncAll(), (Names{"A:c2", "A:c1", "A:g1"}));
+  EXPECT_EQ(syncAll(), (std::vector<std::string>{"A:c2", "A:c1", "A:g1"}));
   EXPECT_EQ(client_->mirrorSize(), 3u);
   EXPECT_TRUE(syncAll().empty());
 
@@ -55,7 +54,7 @@ TEST_F(SessionChanges, AddsModifiesAndDeletesFollowTruthInTheOrderItChanged) {
   store_->putRecords({contact("c3", "Cy")});
   auto session = begin(*client_);
   auto changes = drain(*session, kContacts);
-  EXPECT_EQ(summary(changes), (Names{"M:c1", "D:c2", "A:c3"}));
+  EXPECT_EQ(summary(changes), (std::vector<std::string>{"M:c1", "D:c2", "A:c3"}));
   ASSERT_TRUE(changes[0].record);
   EXPECT_EQ(*changes[0].record->find(TesselAttribute_Contacts_Contact_FirstName), Value("Anne"));
   EXPECT_FALSE(changes[1].record);
@@ -64,37 +63,37 @@ TEST_F(SessionChanges, AddsModifiesAndDeletesFollowTruthInTheOrderItChanged) {
   session.reset();
   session = Session::begin(*client_, kContacts);
   session->prepareToPullChanges({std::string(TesselEntity_Contacts_Group)});
-  EXPECT_EQ(summary(drain(*session, kContacts)), (Names{"A:g2"}));
+  EXPECT_EQ(summary(drain(*session, kContacts)), (std::vector<std::string>{"A:g2"}));
   session->prepareToPullChanges(kContacts);
   EXPECT_EQ(summary(drain(*session, {std::string(TesselEntity_Contacts_Contact)})),
-            (Names{"M:c1", "D:c2", "A:c3"}));
+            (std::vector<std::string>{"M:c1", "D:c2", "A:c3"}));
 }
 
 TEST_F(SessionChanges, ARecordAFilterNowRefusesBecomesADeleteAndComesBackWhenAllowed) {
   store_->putRecords({contact("c1", "Ann"), contact("c2", "Bob"), group("g1", "Friends")});
-  client_->setFilters({std::make_shared<NameFilter>(Names{"Bob"})});
-  EXPECT_EQ(syncAll(), (Names{"A:c1", "A:g1"}));
+  client_->setFilters({std::make_shared<NameFilter>(std::vector<std::string>{"Bob"})});
+  EXPECT_EQ(syncAll(), (std::vector<std::string>{"A:c1", "A:g1"}));
 
-  client_->setFilters({std::make_shared<NameFilter>(Names{"Ann"})});
-  EXPECT_EQ(syncAll(), (Names{"D:c1", "A:c2"}));
+  client_->setFilters({std::make_shared<NameFilter>(std::vector<std::string>{"Ann"})});
+  EXPECT_EQ(syncAll(), (std::vector<std::string>{"D:c1", "A:c2"}));
 
   // The filter judges only contacts: a group is never refused. Every filter must accept.
-  client_->setFilters({std::make_shared<NameFilter>(Names{"Friends"}),
+  client_->setFilters({std::make_shared<NameFilter>(std::vector<std::string>{"Friends"}),
                        std::make_shared<OpaqueFilter>("Foreign", zt::platform::Data{1, 2}),
-                       std::make_shared<NameFilter>(Names{"Bob"})});
-  EXPECT_EQ(syncAll(), (Names{"A:c1", "D:c2"}));
+                       std::make_shared<NameFilter>(std::vector<std::string>{"Bob"})});
+  EXPECT_EQ(syncAll(), (std::vector<std::string>{"A:c1", "D:c2"}));
 }
 
 TEST_F(SessionChanges, ReplaceModeDeliversEveryPassingRecordAsAnAdd) {
   store_->putRecords({contact("c1", "Ann"), contact("c2", "Bob")});
-  EXPECT_EQ(syncAll(), (Names{"A:c1", "A:c2"}));
+  EXPECT_EQ(syncAll(), (std::vector<std::string>{"A:c1", "A:c2"}));
   store_->deleteRecords({"c2"});
-  client_->setFilters({std::make_shared<NameFilter>(Names{"Cy"})});
+  client_->setFilters({std::make_shared<NameFilter>(std::vector<std::string>{"Cy"})});
   store_->putRecords({contact("c3", "Cy"), contact("c4", "Dee")});
 
   client_->shouldReplaceClientRecords({std::string(TesselEntity_Contacts_Contact)});
   auto changes = syncAll();
-  EXPECT_EQ(changes, (Names{"A:c1", "A:c4"}));
+  EXPECT_EQ(changes, (std::vector<std::string>{"A:c1", "A:c4"}));
   // The client now holds exactly what was delivered: c2 (deleted) is forgotten, and a normal
   // session afterwards has nothing to say.
   EXPECT_EQ(client_->mirrorSize(), 2u);
@@ -112,11 +111,11 @@ TEST_F(SessionChanges, OnlyAcceptedChangesAreCommittedAndTheOthersComeBack) {
     session->clientAcceptedChanges("not a change");
     session->clientCommittedAcceptedChanges();
     // A committed change is not offered again in the same session.
-    EXPECT_EQ(summary(drain(*session, kContacts)), (Names{"A:c1", "A:c3"}));
+    EXPECT_EQ(summary(drain(*session, kContacts)), (std::vector<std::string>{"A:c1", "A:c3"}));
     session->finishSyncing();
   }
   EXPECT_EQ(client_->mirrorSize(), 1u);
-  EXPECT_EQ(syncAll(), (Names{"A:c1", "A:c3"}));
+  EXPECT_EQ(syncAll(), (std::vector<std::string>{"A:c1", "A:c3"}));
 }
 
 TEST_F(SessionChanges, ChangesWithoutRecordsAndAcceptedInOneCallCommitTheSame) {
@@ -144,9 +143,9 @@ TEST_F(SessionChanges, ChangesWithoutRecordsAndAcceptedInOneCallCommitTheSame) {
     session->finishSyncing();
   }
   EXPECT_EQ(client_->mirrorSize(), 299u);
-  EXPECT_EQ(syncAll(), (Names{"A:c7"}));
+  EXPECT_EQ(syncAll(), (std::vector<std::string>{"A:c7"}));
   store_->deleteRecords({"c1", "c2"});
-  EXPECT_EQ(syncAll(), (Names{"D:c1", "D:c2"}));
+  EXPECT_EQ(syncAll(), (std::vector<std::string>{"D:c1", "D:c2"}));
   EXPECT_EQ(client_->mirrorSize(), 298u);
 }
 
@@ -164,7 +163,7 @@ TEST_F(SessionChanges, CancelDropsAcceptancesThatWereNotCommitted) {
   }
   EXPECT_EQ(client_->mirrorSize(), 1u);
   EXPECT_EQ(client_->lastSession()->outcome, SessionOutcome::Cancelled);
-  EXPECT_EQ(syncAll(), (Names{"A:c2"}));
+  EXPECT_EQ(syncAll(), (std::vector<std::string>{"A:c2"}));
   EXPECT_EQ(client_->lastSession()->outcome, SessionOutcome::Finished);
 }
 
