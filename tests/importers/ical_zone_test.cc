@@ -40,9 +40,8 @@ std::string writtenBack(const ICalCalendar& calendar) {
       text += exporter.alarmForRecord(record.record);
     } else if (*entity == TesselEntity_Calendars_Event || *entity == TesselEntity_Calendars_Task) {
       const char* component = *entity == TesselEntity_Calendars_Event ? "VEVENT" : "VTODO";
-      for (const auto& [key, value] : record.record) {
+      for (const auto& [key, value] : record.record)
         text += exporter.propertyForKey(key, component, &value).value_or("");
-      }
     }
   }
   return text;
