@@ -16,10 +16,9 @@ TEST(CalendarDay, MonthLengthsAndLeapYearsOfAnyYear) {
       {2024, 13, 1, false},  {2024, 1, 0, false},    {-4, 2, 29, true},
       {400000, 2, 29, true}, {100100, 2, 29, false}, {-999999999, 12, 31, true},
   };
-  for (const Case& c : cases) {
+  for (const Case& c : cases)
     EXPECT_EQ(isCalendarDay(c.year, c.month, c.day), c.exists)
         << c.year << "-" << c.month << "-" << c.day;
-  }
 }
 
 }  // namespace
