@@ -271,9 +271,7 @@ TEST_F(ContactPhoto, PictureBombsAndForeignFormatsAreRefusedAsUndecodable) {
 // ----- failing services -----
 
 struct Failures {
-  bool scale = false;
-  bool render = false;
-  bool encode = false;
+  bool scale = false, render = false, encode = false;
 };
 
 class FakeImage final : public platform::Image {
