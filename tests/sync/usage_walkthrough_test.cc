@@ -8,6 +8,7 @@
 #include <set>
 #include <sstream>
 #include <string>
+#include <tuple>
 #include <vector>
 
 #include "support/files.h"
@@ -128,11 +129,8 @@ TEST_F(UsageWalkthrough, EveryCommandOfThePageRunsAndThePlayerEndsUpSynced) {
 
 TEST_F(UsageWalkthrough, TheMessagesMetOnTheWay) {
   const std::string tessel = TESSEL_TEST_BINARY;
-  const struct {
-    std::string script;
-    int status;
-    std::string says;  // in standard output and error
-  } steps[] = {
+  // A script, its status, and what it says in standard output and error.
+  const std::tuple<std::string, int, std::string> steps[] = {
       {tessel + " --version", 0, "tessel 38\n"},
       {tessel + " --store other.db init", 0,
        "tessel: warning: zetosynctool reads " +
@@ -146,12 +144,12 @@ TEST_F(UsageWalkthrough, TheMessagesMetOnTheWay) {
       {tessel + " client set --help", 0, "  LastModDateForVCF           when the tool last wrote"},
       {tessel + " defaults --help", 0, "  AlwaysSyncContactImages: photos go to the player"},
   };
-  for (const auto& step : steps) {
-    SCOPED_TRACE(step.script);
-    const auto run = bash("cd '" + folder().string() + "' && " + step.script);
-    EXPECT_EQ(run.status, step.status) << run.out << run.err;
-    EXPECT_CONTAINS(run.out + run.err, step.says);
-    EXPECT_TRUE(!step.says.empty() || run.err.empty()) << run.err;
+  for (const auto& [script, status, says] : steps) {
+    SCOPED_TRACE(script);
+    const auto run = bash("cd '" + folder().string() + "' && " + script);
+    EXPECT_EQ(run.status, status) << run.out << run.err;
+    EXPECT_CONTAINS(run.out + run.err, says);
+    EXPECT_TRUE(!says.empty() || run.err.empty()) << run.err;
   }
   // The defaults file was never half-written by the refused values.
   EXPECT_FALSE(fs::exists(home_ / ".config" / "zetosynctool" / "defaults.conf"));
