@@ -4,6 +4,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cstring>
 #include <fstream>
 
@@ -121,8 +122,7 @@ TEST_F(ContactPhoto, PicturesAreReEncodedScaledOrConvertedToJPEG) {
   }
   // The rendering state is made once for all the pictures.
   EXPECT_EQ(servicesMade_, 1);
-  const std::vector<std::string> lines = log();
-  EXPECT_EQ(std::count(lines.begin(), lines.end(), "Creating Vuro context"), 1);
+  EXPECT_EQ(std::ranges::count(log(), "Creating Vuro context"), 1);
 }
 
 TEST_F(ContactPhoto, ALargeJPEGWhoseReEncodingIsLargerKeepsItsSource) {
@@ -130,14 +130,11 @@ TEST_F(ContactPhoto, ALargeJPEGWhoseReEncodingIsLargerKeepsItsSource) {
   const Data source =
       picture({.size = {256, 256}, .pattern = PicturePattern::Noise, .jpegQuality = 55});
   ASSERT_GT(source.size(), 20480u);
-  const std::optional<Data> photo = preparation_.photoForContact(contact(source));
-  EXPECT_EQ(photo, source);
-  bool explained = false;
-  for (const std::string& line : log()) {
-    explained = explained || (line.starts_with("After reducing the image, size is ") &&
-                              line.ends_with("l, so we better use the one in truth"));
-  }
-  EXPECT_TRUE(explained);
+  EXPECT_EQ(preparation_.photoForContact(contact(source)), source);
+  EXPECT_TRUE(std::ranges::any_of(log(), [](const std::string& line) {
+    return line.starts_with("After reducing the image, size is ") &&
+           line.ends_with("l, so we better use the one in truth");
+  }));
 }
 
 TEST_F(ContactPhoto, APictureOfOneByteAddsNothing) {
@@ -274,9 +271,7 @@ TEST_F(ContactPhoto, PictureBombsAndForeignFormatsAreRefusedAsUndecodable) {
 // ----- failing services -----
 
 struct Failures {
-  bool scale = false;
-  bool render = false;
-  bool encode = false;
+  bool scale = false, render = false, encode = false;
 };
 
 class FakeImage final : public platform::Image {
@@ -314,7 +309,7 @@ class FakeService final : public platform::ImageService {
 
 TEST_F(ContactPhoto, AServiceThatCannotStartIsAskedAgainAtTheNextPicture) {
   platform::Log::setDebugEnabled(false);
-  std::vector<platform::ImageServiceFailure> failures = {
+  const platform::ImageServiceFailure failures[] = {
       platform::ImageServiceFailure::NoRenderingContext,
       platform::ImageServiceFailure::OutOfMemory};
   int asked = 0;

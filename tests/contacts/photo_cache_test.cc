@@ -38,17 +38,15 @@ platform::Dictionary contact(std::string name, Data image) {
 
 // One picture of each way a conversion ends, and one that needs none.
 std::vector<platform::Dictionary> contacts() {
-  std::vector<platform::Dictionary> all;
-  all.push_back(
+  return {
       contact("Scaled",
-              picture({.size = {900, 600}, .pattern = PicturePattern::Noise, .jpegQuality = 95})));
-  all.push_back(contact("Png", picture({.size = {40, 30}, .format = PictureFormat::PNG})));
-  all.push_back(
+              picture({.size = {900, 600}, .pattern = PicturePattern::Noise, .jpegQuality = 95})),
+      contact("Png", picture({.size = {40, 30}, .format = PictureFormat::PNG})),
       contact("Larger",
-              picture({.size = {256, 256}, .pattern = PicturePattern::Noise, .jpegQuality = 55})));
-  all.push_back(contact("Garbage", Data(30000, 0x42)));
-  all.push_back(contact("Small", picture({.size = {20, 20}})));
-  return all;
+              picture({.size = {256, 256}, .pattern = PicturePattern::Noise, .jpegQuality = 55})),
+      contact("Garbage", Data(30000, 0x42)),
+      contact("Small", picture({.size = {20, 20}})),
+  };
 }
 
 // The photos and the log of one run over the contacts.
@@ -59,10 +57,10 @@ struct PhotoRun {
 };
 
 enum class Prefetch { No, Yes };
+using Threads = ContactPhotoPreparation::Threads;
 
 PhotoRun run(const std::vector<platform::Dictionary>& cards, std::unique_ptr<PhotoCache> cache,
-             Prefetch prefetch, ContactPhotoPreparation::Threads threads,
-             bool serviceFails = false) {
+             Prefetch prefetch, Threads threads, bool serviceFails = false) {
   PhotoRun result;
   test_support::CapturedLog log;
   ContactPhotoPreparation preparation(
@@ -75,9 +73,8 @@ PhotoRun run(const std::vector<platform::Dictionary>& cards, std::unique_ptr<Pho
       std::move(cache), threads);
   if (prefetch == Prefetch::Yes) {
     std::vector<const Data*> pictures;
-    for (const auto& card : cards) {
+    for (const auto& card : cards)
       pictures.push_back(card.dataAt(tessel::TesselAttribute_Contacts_Contact_Image));
-    }
     preparation.prefetch(pictures);
   }
   for (const auto& card : cards) result.photos.push_back(preparation.photoForContact(card));
@@ -98,8 +95,7 @@ class PhotoCacheTest : public ::testing::Test {
 
   test_support::TemporaryFolder folder_;
   const std::vector<platform::Dictionary> cards_ = contacts();
-  const PhotoRun converted_ =
-      run(cards_, nullptr, Prefetch::No, ContactPhotoPreparation::Threads::One);
+  const PhotoRun converted_ = run(cards_, nullptr, Prefetch::No, Threads::One);
 };
 
 TEST_F(PhotoCacheTest, EveryPathGivesTheBytesAndLinesOfAConversion) {
@@ -109,16 +105,14 @@ TEST_F(PhotoCacheTest, EveryPathGivesTheBytesAndLinesOfAConversion) {
             *cards_[2].dataAt(tessel::TesselAttribute_Contacts_Contact_Image));
   ASSERT_FALSE(converted_.photos[3]);
 
-  const PhotoRun first =
-      run(cards_, cache(), Prefetch::Yes, ContactPhotoPreparation::Threads::AllCores);
+  const PhotoRun first = run(cards_, cache(), Prefetch::Yes, Threads::AllCores);
   EXPECT_EQ(first.photos, converted_.photos);
   EXPECT_EQ(first.log, converted_.log);
   // Scaled, Png, Larger and Garbage.
   EXPECT_EQ(entriesIn(folder_.path() / "photos").size(), 4u);
 
   for (Prefetch prefetch : {Prefetch::No, Prefetch::Yes}) {
-    const PhotoRun again =
-        run(cards_, cache(), prefetch, ContactPhotoPreparation::Threads::AllCores);
+    const PhotoRun again = run(cards_, cache(), prefetch, Threads::AllCores);
     EXPECT_EQ(again.photos, converted_.photos);
     EXPECT_EQ(again.log, converted_.log);
     EXPECT_EQ(again.servicesMade, 0) << "every picture comes from the cache";
@@ -126,7 +120,7 @@ TEST_F(PhotoCacheTest, EveryPathGivesTheBytesAndLinesOfAConversion) {
 }
 
 TEST_F(PhotoCacheTest, DamagedEntriesAndLinksAreConvertedAgainAndReplaced) {
-  run(cards_, cache(), Prefetch::No, ContactPhotoPreparation::Threads::One);
+  run(cards_, cache(), Prefetch::No, Threads::One);
   std::vector<fs::path> entries = entriesIn(folder_.path() / "photos");
   ASSERT_EQ(entries.size(), 4u);
   // One entry cut short, one garbage, one a link to a file outside the folder.
@@ -138,37 +132,32 @@ TEST_F(PhotoCacheTest, DamagedEntriesAndLinksAreConvertedAgainAndReplaced) {
   fs::remove(entries[2]);
   fs::create_symlink(outside, entries[2]);
 
-  const PhotoRun again =
-      run(cards_, cache(), Prefetch::Yes, ContactPhotoPreparation::Threads::AllCores);
+  const PhotoRun again = run(cards_, cache(), Prefetch::Yes, Threads::AllCores);
   EXPECT_EQ(again.photos, converted_.photos);
   EXPECT_EQ(again.log, converted_.log);
   EXPECT_EQ(again.servicesMade, 1);
-  for (const fs::path& entry : entriesIn(folder_.path() / "photos")) {
+  for (const fs::path& entry : entriesIn(folder_.path() / "photos"))
     EXPECT_TRUE(fs::is_regular_file(fs::symlink_status(entry))) << entry;
-  }
   EXPECT_EQ(fs::file_size(outside), outsideBytes);
-  EXPECT_EQ(run(cards_, cache(), Prefetch::No, ContactPhotoPreparation::Threads::One).servicesMade,
-            0);
+  EXPECT_EQ(run(cards_, cache(), Prefetch::No, Threads::One).servicesMade, 0);
 }
 
 TEST_F(PhotoCacheTest, ARunKeepsOnlyThePicturesItUsedWithinTheCap) {
-  run(cards_, cache(), Prefetch::No, ContactPhotoPreparation::Threads::One);
+  run(cards_, cache(), Prefetch::No, Threads::One);
   std::ofstream(folder_.path() / "photos" / ".0123.tmp99.1") << "left by a killed run";
   const std::vector<platform::Dictionary> fewer(cards_.begin(), cards_.begin() + 2);
-  run(fewer, cache(), Prefetch::Yes, ContactPhotoPreparation::Threads::One);
+  run(fewer, cache(), Prefetch::Yes, Threads::One);
   EXPECT_EQ(entriesIn(folder_.path() / "photos").size(), 2u);
 
-  run(fewer, PhotoCache::open(folder_.path() / "photos", 1), Prefetch::No,
-      ContactPhotoPreparation::Threads::One);
+  run(fewer, PhotoCache::open(folder_.path() / "photos", 1), Prefetch::No, Threads::One);
   EXPECT_TRUE(entriesIn(folder_.path() / "photos").empty());
 }
 
 TEST_F(PhotoCacheTest, WithoutAServiceAPrefetchedRunLogsTheSameFailures) {
-  const PhotoRun plain = run(cards_, nullptr, Prefetch::No, ContactPhotoPreparation::Threads::One,
+  const PhotoRun plain = run(cards_, nullptr, Prefetch::No, Threads::One,
                              /*serviceFails=*/true);
-  const PhotoRun prefetched =
-      run(cards_, cache(), Prefetch::Yes, ContactPhotoPreparation::Threads::AllCores,
-          /*serviceFails=*/true);
+  const PhotoRun prefetched = run(cards_, cache(), Prefetch::Yes, Threads::AllCores,
+                                  /*serviceFails=*/true);
   EXPECT_EQ(prefetched.photos, plain.photos);
   EXPECT_EQ(prefetched.log, plain.log);
   EXPECT_TRUE(entriesIn(folder_.path() / "photos").empty());

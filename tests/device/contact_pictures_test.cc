@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include <string>
+#include <tuple>
 
 #include "device/probe_test_support.h"
 #include "platform/virtual/virtual_hardware_registry.h"
@@ -20,11 +21,7 @@ using test_support::VirtualPlayerFolder;
 TEST(CheckpointDocument, OnlyATrueNumberInADictionaryMeansPictures) {
   std::string withoutKey = checkpointDocument("<true/>");
   withoutKey.replace(withoutKey.find("vCardWithJPEGSupported"), 22, "vCardWithGIFSupported");
-  const struct {
-    std::string document;
-    bool pictures;
-    std::string last;
-  } cases[] = {
+  const std::tuple<std::string, bool, std::string> cases[] = {
       {checkpointDocument("<true/>"), true, "Value for vCardWithJPEGSupported is 1"},
       {checkpointDocument("<false/>"), false, "Value for vCardWithJPEGSupported is 0"},
       {checkpointDocument("<string>YES</string>"), false,
@@ -38,10 +35,10 @@ TEST(CheckpointDocument, OnlyATrueNumberInADictionaryMeansPictures) {
       // The entity the players write, left in place, is not parsed.
       {checkpointDocument("<true/>&xff;"), false, "Can't parse XML checkpoint data: "},
   };
-  for (const auto& c : cases) {
+  for (const auto& [document, pictures, last] : cases) {
     CapturedLog log;
-    EXPECT_EQ(checkpointSupportsContactPictures(bytesOf(c.document)), c.pictures) << c.last;
-    EXPECT_TRUE(log.last().starts_with(c.last)) << log.last();
+    EXPECT_EQ(checkpointSupportsContactPictures(bytesOf(document)), pictures) << last;
+    EXPECT_TRUE(log.last().starts_with(last)) << log.last();
   }
 }
 

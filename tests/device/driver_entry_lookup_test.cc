@@ -39,9 +39,8 @@ class TreeRegistry final : public platform::HardwareRegistry {
   std::optional<platform::RegistryIterator> matchingServices(
       const BsdNameMatching& matching) override {
     std::vector<std::string> found;
-    if (auto media = bsdNames.find(matching.bsdName); media != bsdNames.end()) {
+    if (auto media = bsdNames.find(matching.bsdName); media != bsdNames.end())
       found.push_back(media->second);
-    }
     return makeIterator(std::move(found));
   }
   std::optional<platform::RegistryEntry> parent(const platform::RegistryEntry& entry) override {

@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include <string>
+#include <tuple>
 
 #include "platform/time_zone.h"
 
@@ -30,22 +31,17 @@ std::string expected(const std::string& id, const char* standard, const char* da
 // in the south; a zone without daylight time has only its standard block; unnamed zones are
 // named by their offsets.
 TEST(TimeZoneBlockTest, EachZoneGetsTheBlocksOfItsOffsets) {
-  const struct {
-    TimeZone zone;
-    std::string id;
-    const char* standard;
-    const char* daylight;
-  } cases[] = {
+  const std::tuple<TimeZone, std::string, const char*, const char*> cases[] = {
       {TimeZone::named("Australia/Sydney").value(), "Australia/Sydney", "1000", "1100"},
       {TimeZone::named("Asia/Kolkata").value(), "Asia/Kolkata", "0530", nullptr},
       {TimeZone::unnamed(3600, 7200, "M3.5.0,M10.5.0/3").value(), "UNKNOWN-3600-7200", "0100",
        "0200"},
       {TimeZone::unnamed(-12600).value(), "UNKNOWN--12600-0", "-0330", nullptr},
   };
-  for (const auto& c : cases) {
-    SCOPED_TRACE(c.id);
-    EXPECT_EQ(timezoneBlockID(c.zone), c.id);
-    EXPECT_EQ(block(c.zone), expected(c.id, c.standard, c.daylight));
+  for (const auto& [zone, id, standard, daylight] : cases) {
+    SCOPED_TRACE(id);
+    EXPECT_EQ(timezoneBlockID(zone), id);
+    EXPECT_EQ(block(zone), expected(id, standard, daylight));
   }
 }
 

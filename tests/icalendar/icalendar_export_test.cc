@@ -4,6 +4,7 @@
 
 #include <cstdint>
 #include <string>
+#include <tuple>
 
 #include "platform/log.h"
 #include "platform/value.h"
@@ -59,20 +60,16 @@ TEST(EscapingTest, ValuesParametersAndQuotes) {
 }
 
 TEST(NumberFormsTest, OffsetsDurationsBooleansAndDecimals) {
-  const struct {
-    std::int64_t seconds;
-    const char* offset;
-    const char* duration;
-  } cases[] = {{-1800, "-0030", "-PT30M"},
-               {3661, "+010101", "PT1H1M1S"},
-               {90000, "+0100", "P1DT1H"},
-               {0, "+0000", "PT0S"}};
-  for (const auto& c : cases) {
-    SCOPED_TRACE(c.seconds);
+  const std::tuple<std::int64_t, std::string, std::string> cases[] = {{-1800, "-0030", "-PT30M"},
+                                                                      {3661, "+010101", "PT1H1M1S"},
+                                                                      {90000, "+0100", "P1DT1H"},
+                                                                      {0, "+0000", "PT0S"}};
+  for (const auto& [seconds, expectedOffset, duration] : cases) {
+    SCOPED_TRACE(seconds);
     std::string offset;
-    appendRFC2445UTCOffsetRepresentationTo(Number::integer(c.seconds), offset);
-    EXPECT_EQ(offset, c.offset);
-    EXPECT_EQ(iCalendarDurationRepresentation(Number::integer(c.seconds)), c.duration);
+    appendRFC2445UTCOffsetRepresentationTo(Number::integer(seconds), offset);
+    EXPECT_EQ(offset, expectedOffset);
+    EXPECT_EQ(iCalendarDurationRepresentation(Number::integer(seconds)), duration);
   }
   std::string buffer;
   appendRFC2445BoolRepresentationTo(Number::boolean(false), buffer);

@@ -39,9 +39,8 @@ ICalCalendar readDataFile(const std::string& name) {
 
 // The record of that identifier as a typed JSON line, without its identifier.
 std::string json(const ICalCalendar& calendar, const std::string& id) {
-  for (const Record& record : calendar.records) {
+  for (const Record& record : calendar.records)
     if (record.id == id) return recordToJson(record.record);
-  }
   return "(absent: " + id + ")";
 }
 

@@ -30,9 +30,7 @@ void collectParameters(icalcomponent* component, std::map<std::string, std::stri
   }
   for (icalcomponent* child = icalcomponent_get_first_component(component, ICAL_ANY_COMPONENT);
        child != nullptr; child = icalcomponent_get_next_component(component, ICAL_ANY_COMPONENT)) {
-    if (icalcomponent_isa(child) != ICAL_VTIMEZONE_COMPONENT) {
-      collectParameters(child, seen, zones);
-    }
+    if (icalcomponent_isa(child) != ICAL_VTIMEZONE_COMPONENT) collectParameters(child, seen, zones);
   }
 }
 

@@ -40,9 +40,8 @@ std::string writtenBack(const ICalCalendar& calendar) {
       text += exporter.alarmForRecord(record.record);
     } else if (*entity == TesselEntity_Calendars_Event || *entity == TesselEntity_Calendars_Task) {
       const char* component = *entity == TesselEntity_Calendars_Event ? "VEVENT" : "VTODO";
-      for (const auto& [key, value] : record.record) {
+      for (const auto& [key, value] : record.record)
         text += exporter.propertyForKey(key, component, &value).value_or("");
-      }
     }
   }
   return text;
@@ -81,10 +80,7 @@ std::string startZone(const ICalCalendar& calendar, const std::string& uid) {
 // TZIDs without a VTIMEZONE: IANA names in other forms and behind vendor prefixes, Windows
 // zone names and Outlook's display names.
 TEST(ICalZones, NamesWithoutVTimezone) {
-  const struct {
-    const char* tzid;
-    const char* zone;
-  } cases[] = {
+  const std::pair<std::string, std::string> cases[] = {
       {"Europe/Berlin", "Europe/Berlin"},
       {"Europe_Berlin", "Europe/Berlin"},
       {"Europe/lisbon", "Europe/Lisbon"},
@@ -104,16 +100,16 @@ TEST(ICalZones, NamesWithoutVTimezone) {
       {"Kuala Lumpur\\, Singapore", "Asia/Singapore"},
       {"pacific time (us & canada)", "America/Los_Angeles"},
   };
-  for (const auto& c : cases) {
-    SCOPED_TRACE(c.tzid);
+  for (const auto& [tzid, zone] : cases) {
+    SCOPED_TRACE(tzid);
     ICalCalendarSource source;
     source.identifier = "cal";
     source.files.push_back(
         {"test.ics",
          "BEGIN:VCALENDAR\r\nVERSION:2.0\r\nPRODID:-//Test//EN\r\nBEGIN:VEVENT\r\n"
          "UID:x\r\nDTSTART;TZID=\"" +
-             std::string(c.tzid) + "\":20260110T090000\r\nEND:VEVENT\r\nEND:VCALENDAR\r\n"});
-    EXPECT_EQ(startZone(readICalCalendar(source), "x"), c.zone);
+             tzid + "\":20260110T090000\r\nEND:VEVENT\r\nEND:VCALENDAR\r\n"});
+    EXPECT_EQ(startZone(readICalCalendar(source), "x"), zone);
   }
 }
 
@@ -122,10 +118,7 @@ TEST(ICalZones, NamesWithoutVTimezone) {
 // matches no zone of the database stays unnamed.
 TEST(ICalZones, NamesFromTheVTimezone) {
   const ICalCalendar calendar = readZoneFile("by_vtimezone.ics");
-  const struct {
-    const char* uid;
-    const char* zone;
-  } cases[] = {
+  const std::pair<std::string, std::string> cases[] = {
       {"lisbon", "Europe/Lisbon"},         // X-LIC-LOCATION
       {"office", "America/Chicago"},       // TZURL
       {"customized", "America/New_York"},  // US rules since 2007, daylight time since 1970
@@ -133,7 +126,7 @@ TEST(ICalZones, NamesFromTheVTimezone) {
       {"outlook", "Europe/Berlin"},        // display name
       {"nowhere", "UNNAMED 11820"},        // +03:17 is no zone's offset
   };
-  for (const auto& c : cases) EXPECT_EQ(startZone(calendar, c.uid), c.zone) << c.uid;
+  for (const auto& [uid, zone] : cases) EXPECT_EQ(startZone(calendar, uid), zone) << uid;
 }
 
 }  // namespace

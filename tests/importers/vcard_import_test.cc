@@ -30,9 +30,8 @@ const fs::path kData = fs::path(ZT_TEST_DATA_DIR) / "data" / "vcard";
 
 std::map<std::string, Dictionary> byId(const std::vector<Record>& records) {
   std::map<std::string, Dictionary> map;
-  for (const Record& record : records) {
+  for (const Record& record : records)
     EXPECT_TRUE(map.emplace(record.id, record.record).second) << "twice: " << record.id;
-  }
   return map;
 }
 

@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include <string>
+#include <tuple>
 
 namespace zt::platform::base64 {
 namespace {
@@ -13,11 +14,7 @@ std::string decodedText(std::string_view text, Form form) {
 }
 
 TEST(Base64Decode, TheFormsDifferInBlanksPaddingAndUnusedBits) {
-  struct Case {
-    std::string_view text;
-    std::string canonical, tolerant;
-  };
-  const Case cases[] = {
+  const std::tuple<std::string_view, std::string, std::string> cases[] = {
       {"TWE=", "Ma", "Ma"},
       {"TWE", "<none>", "Ma"},           // padding left out
       {"TW\r\n E=", "<none>", "Ma"},     // a folded line
@@ -26,9 +23,9 @@ TEST(Base64Decode, TheFormsDifferInBlanksPaddingAndUnusedBits) {
       {"T===", "<none>", "<none>"},      // one digit holds no byte
       {"TW-=", "<none>", "<none>"},      // outside the alphabet
   };
-  for (const Case& c : cases) {
-    EXPECT_EQ(decodedText(c.text, Form::Canonical), c.canonical) << c.text;
-    EXPECT_EQ(decodedText(c.text, Form::Tolerant), c.tolerant) << c.text;
+  for (const auto& [text, canonical, tolerant] : cases) {
+    EXPECT_EQ(decodedText(text, Form::Canonical), canonical) << text;
+    EXPECT_EQ(decodedText(text, Form::Tolerant), tolerant) << text;
   }
 }
 

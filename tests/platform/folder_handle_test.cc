@@ -6,6 +6,7 @@
 #include <unistd.h>
 
 #include <string>
+#include <tuple>
 #include <vector>
 
 #include "platform/atomic_file.h"
@@ -143,23 +144,18 @@ TEST_F(FolderHandleTest, ChildFoldersAreOpenedOrCreatedButNeverThroughALink) {
   EXPECT_TRUE(fs::is_directory(folder / "Contacts"));
   EXPECT_TRUE(handle.openChild("Contacts", IfMissing::Fail).ok());
 
-  const struct {
-    const char* name;
-    IfMissing ifMissing;
-    const char* reason;
-  } refused[] = {
+  const std::tuple<std::string, IfMissing, std::string> refused[] = {
       {"Absent", IfMissing::Fail, "No such file or directory"},
       {"File", IfMissing::Create, "Not a directory"},
       // O_NOFOLLOW with O_DIRECTORY: a link is not a folder (open(2)).
       {"Link", IfMissing::Create, "Not a directory"},
       {"Dangling", IfMissing::Create, "Not a directory"},
   };
-  for (const auto& entry : refused) {
-    SCOPED_TRACE(entry.name);
-    auto opened = handle.openChild(entry.name, entry.ifMissing);
+  for (const auto& [name, ifMissing, reason] : refused) {
+    SCOPED_TRACE(name);
+    auto opened = handle.openChild(name, ifMissing);
     ASSERT_FALSE(opened.ok());
-    EXPECT_EQ(opened.error(),
-              "Cannot open the folder " + (folder / entry.name).string() + ": " + entry.reason);
+    EXPECT_EQ(opened.error(), "Cannot open the folder " + (folder / name).string() + ": " + reason);
   }
   EXPECT_TRUE(namesIn(outside).empty());
   EXPECT_FALSE(fs::exists(folder / "absent"));

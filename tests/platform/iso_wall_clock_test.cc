@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include <string>
+#include <tuple>
 
 namespace zt::platform::iso {
 namespace {
@@ -24,13 +25,7 @@ TEST(IsoWallClock, ReadsTheFieldsAndStopsWhereTheFormEnds) {
   constexpr auto Extended = YearForm::Extended;
   constexpr auto Required = SecondsForm::Required;
   constexpr auto Optional = SecondsForm::Optional;
-  struct Case {
-    std::string_view text;
-    YearForm year;
-    SecondsForm seconds;
-    std::string read;
-  };
-  const Case cases[] = {
+  const std::tuple<std::string_view, YearForm, SecondsForm, std::string> cases[] = {
       {"2026-11-21T10:05:09Z", Four, Required, "2026-11-21 10:5:9+0 @19"},
       {"2026-11-21T10:05", Four, Required, "form"},
       {"2026-11-21T10:05", Extended, Optional, "2026-11-21 10:5:0+0 @16"},
@@ -43,7 +38,8 @@ TEST(IsoWallClock, ReadsTheFieldsAndStopsWhereTheFormEnds) {
       {"2026-1-21T10:05:09", Four, Required, "form"},
       {"2026-13-32T25:61:61", Four, Required, "2026-13-32 25:61:61+0 @19"},  // checked later
   };
-  for (const Case& c : cases) EXPECT_EQ(reading(c.text, c.year, c.seconds), c.read) << c.text;
+  for (const auto& [text, year, seconds, read] : cases)
+    EXPECT_EQ(reading(text, year, seconds), read) << text;
 }
 
 }  // namespace

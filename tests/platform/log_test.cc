@@ -7,6 +7,7 @@
 #include <sstream>
 #include <string>
 #include <thread>
+#include <tuple>
 #include <vector>
 
 #include "support/captured_log.h"
@@ -20,11 +21,7 @@ struct Described {
 
 TEST(LogFormat, ConversionsFlagsAndArgumentsThatDoNotMatch) {
   const std::string longText(5000, 'x');
-  const struct {
-    std::string format;
-    std::vector<LogArgument> arguments;
-    std::string expected;
-  } cases[] = {
+  const std::tuple<std::string, std::vector<LogArgument>, std::string> cases[] = {
       // "%ul" is the unsigned number followed by a literal "l", not an unsigned long.
       {"count %ul", {42u}, "count 42l"},
       {"%016llX", {std::uint64_t{0xA27001A2B3C4DULL}}, "000A27001A2B3C4D"},
@@ -43,9 +40,8 @@ TEST(LogFormat, ConversionsFlagsAndArgumentsThatDoNotMatch) {
       {"%s %d %x", {42, "text", reinterpret_cast<const void*>(0xbeef)}, "42 text beef"},
       {"[%d][%s][%@][%f]", {}, "[][(null)][(null)][]"},
   };
-  for (const auto& c : cases)
-    EXPECT_EQ(Log::format(c.format, std::span<const LogArgument>(c.arguments)), c.expected)
-        << c.format;
+  for (const auto& [format, arguments, expected] : cases)
+    EXPECT_EQ(Log::format(format, std::span<const LogArgument>(arguments)), expected) << format;
 }
 
 // Sends the log to a fresh file for the duration of a test and restores everything after.

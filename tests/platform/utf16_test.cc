@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include <string>
+#include <tuple>
 #include <utility>
 
 namespace zt::platform::utf16 {
@@ -37,11 +38,7 @@ TEST(Utf16Conversion, RoundTripsAndMalformedInputBecomesReplacementCharacters) {
 TEST(Utf16Fold, FoldsAtMultiplesOfTheLimitSplittingPairsCutInside) {
   std::string grins;
   for (int i = 0; i < 3; ++i) grins += kGrin;  // 6 units
-  const struct {
-    std::string text;
-    std::size_t limit;
-    std::string expected;
-  } cases[] = {
+  const std::tuple<std::string, std::size_t, std::string> cases[] = {
       {std::string(9, 'd'), 3, "ddd\r\n ddd\r\n ddd\r\n "},
       // A pair ending exactly at the limit is kept whole; one cut inside is split.
       {std::string(70, 'a') + kGrin + "b", 72, std::string(70, 'a') + kGrin + "\r\n b"},
@@ -53,10 +50,10 @@ TEST(Utf16Fold, FoldsAtMultiplesOfTheLimitSplittingPairsCutInside) {
        "cd",
        3, "ab\xFF\r\n cd"},
   };
-  for (const auto& c : cases) {
-    std::string folded = c.text;
-    fold(folded, c.limit);
-    EXPECT_EQ(folded, c.expected) << testing::PrintToString(c.text);
+  for (auto [folded, limit, expected] : cases) {
+    const std::string text = folded;
+    fold(folded, limit);
+    EXPECT_EQ(folded, expected) << testing::PrintToString(text);
   }
 }
 

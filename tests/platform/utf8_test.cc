@@ -3,16 +3,13 @@
 #include <gtest/gtest.h>
 
 #include <string_view>
+#include <utility>
 
 namespace zt::platform::utf8 {
 namespace {
 
 TEST(Utf8, SequenceLengthsAndTheFormsThatAreNotUtf8) {
-  struct Case {
-    std::string_view bytes;
-    std::size_t length;
-  };
-  const Case cases[] = {
+  const std::pair<std::string_view, std::size_t> cases[] = {
       {"A", 1},
       {"\xC3\xA9", 2},          // é
       {"\xE2\x82\xAC", 3},      // €
@@ -23,9 +20,9 @@ TEST(Utf8, SequenceLengthsAndTheFormsThatAreNotUtf8) {
       {"\xE2\x82", 0},          // cut short by the end
       {"\xE2\x28\xA1", 0},      // a continuation byte missing
   };
-  for (const Case& c : cases) {
-    EXPECT_EQ(sequenceLength(c.bytes, 0), c.length) << testing::PrintToString(c.bytes);
-    EXPECT_EQ(isValid(c.bytes), c.length != 0) << testing::PrintToString(c.bytes);
+  for (const auto& [bytes, length] : cases) {
+    EXPECT_EQ(sequenceLength(bytes, 0), length) << testing::PrintToString(bytes);
+    EXPECT_EQ(isValid(bytes), length != 0) << testing::PrintToString(bytes);
   }
   EXPECT_TRUE(isValid(""));
   EXPECT_FALSE(isValid("ok \xC3"));

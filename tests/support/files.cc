@@ -40,10 +40,9 @@ std::string utf8OfUtf16BigEndian(std::string_view bytes) {
   EXPECT_EQ(bytes.size() % 2, 0u) << "odd length";
   EXPECT_TRUE(bytes.starts_with("\xFE\xFF")) << "no byte-order mark";
   std::u16string units;
-  for (std::size_t i = 2; i + 1 < bytes.size(); i += 2) {
+  for (std::size_t i = 2; i + 1 < bytes.size(); i += 2)
     units.push_back(static_cast<char16_t>((static_cast<unsigned char>(bytes[i]) << 8) |
                                           static_cast<unsigned char>(bytes[i + 1])));
-  }
   return platform::utf16::toUtf8(units);
 }
 
@@ -52,10 +51,9 @@ std::string utf8OfUtf16BigEndian(std::string_view bytes) {
   for (std::size_t i = 0; i < std::max(want.size(), got.size()); ++i) {
     const std::string w = i < want.size() ? want[i] : "(end of text)";
     const std::string g = i < got.size() ? got[i] : "(end of text)";
-    if (w != g) {
+    if (w != g)
       return ::testing::AssertionFailure()
              << "line " << i + 1 << ": expected \"" << w << "\" got \"" << g << "\"";
-    }
   }
   if (expected != actual) return ::testing::AssertionFailure() << "texts differ in line ends";
   return ::testing::AssertionSuccess();

@@ -57,9 +57,8 @@ ProcessRun runProcess(const std::vector<std::string>& words, const ProcessOption
     posix_spawn_file_actions_addopen(&actions, 2, err.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
   }
   std::vector<std::string> argv = words, envp;
-  if (options.environment) {
+  if (options.environment)
     for (const auto& [name, value] : *options.environment) envp.push_back(name + "=" + value);
-  }
   std::vector<char*> argvPointers = pointers(argv), envpPointers = pointers(envp);
   ProcessRun run;
   pid_t pid = 0;
@@ -86,9 +85,8 @@ BackgroundProcess::BackgroundProcess(const std::vector<std::string>& words) {
   std::vector<std::string> argv = words;
   std::vector<char*> argvPointers = pointers(argv);
   pid_t pid = 0;
-  if (posix_spawn(&pid, argvPointers[0], &actions, nullptr, argvPointers.data(), environ) == 0) {
+  if (posix_spawn(&pid, argvPointers[0], &actions, nullptr, argvPointers.data(), environ) == 0)
     pid_ = pid;
-  }
   posix_spawn_file_actions_destroy(&actions);
 }
 

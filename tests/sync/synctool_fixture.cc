@@ -269,9 +269,8 @@ LockHolder::LockHolder(const std::map<std::string, std::string>& environment,
     std::unique_ptr<platform::DeviceLibrary> library = platform::makeDeviceLibrary();
     std::vector<platform::ZetoRef> devices;
     if (library->ZetoCopyConnected(devices) == platform::kZetoSuccess) {
-      for (platform::ZetoRef device : devices) {
+      for (platform::ZetoRef device : devices)
         if (library->ZetoGetUniqueID(device) == uniqueId) result = library->ZetoAquireLock(device);
-      }
     }
     if (::write(answer[1], &result, sizeof result) != sizeof result) ::_exit(1);
     // Holds the lock until the test closes its end of the pipe (or dies).

@@ -15,6 +15,7 @@
 #include <map>
 #include <set>
 #include <string>
+#include <tuple>
 #include <vector>
 
 #include "support/files.h"
@@ -204,18 +205,13 @@ TEST_F(KilledSync, EachKillLeavesWholeFilesASoundStoreAndNoChangeLost) {
     for (const double part : {0.3, 0.7}) afterLine(k, length * part);
   // The steps of the file writes and of the clean-up as the player sees them: whatever the
   // load, these land inside the writes.
-  const struct {
-    const char* folder;
-    std::uint32_t event;
-    std::size_t n;
-  } steps[] = {{"Contacts", IN_CREATE, 1},   {"Contacts", IN_CLOSE_WRITE, 1},
-               {"Contacts", IN_MOVED_TO, 1}, {"Calendars", IN_DELETE, 2},
-               {"Calendars", IN_MODIFY, 3},  {"Calendars", IN_MOVED_TO, 4}};
-  for (const auto& step : steps) {
-    moments.push_back({KillAt::afterFileEvent(volume() / step.folder, step.event, step.n),
-                       std::string(step.folder) + " file event " + std::to_string(step.event) +
-                           " #" + std::to_string(step.n)});
-  }
+  const std::tuple<std::string, std::uint32_t, std::size_t> steps[] = {
+      {"Contacts", IN_CREATE, 1},  {"Contacts", IN_CLOSE_WRITE, 1}, {"Contacts", IN_MOVED_TO, 1},
+      {"Calendars", IN_DELETE, 2}, {"Calendars", IN_MODIFY, 3},     {"Calendars", IN_MOVED_TO, 4}};
+  for (const auto& [stepFolder, event, n] : steps)
+    moments.push_back(
+        {KillAt::afterFileEvent(volume() / stepFolder, event, n),
+         stepFolder + " file event " + std::to_string(event) + " #" + std::to_string(n)});
 
   int kills = 0, halfFiles = 0, lostChanges = 0;
   std::set<std::string> leftovers;
@@ -249,10 +245,9 @@ TEST_F(KilledSync, EachKillLeavesWholeFilesASoundStoreAndNoChangeLost) {
     const SynctoolRun recovery = syncClient(kClientID);
     EXPECT_EQ(recovery.finalStatus(), 0) << "after the kill " << where << "\n" << recovery.log;
     const Files recovered = filesOf(volume());
-    for (const auto& file : recovered) {
+    for (const auto& file : recovered)
       if (isTemporary(file.first) && leftovers.insert(file.first).second)
         faults.push_back(where + ": " + file.first + " survives the next run");
-    }
     const std::size_t uncommitted = uncommittedChanges();
     const bool settled = syncClient(kClientID).logContains("Nothing to push for contacts...");
     if (withoutTemporaries(recovered) != after || uncommitted != 0 || !settled) {

@@ -4,6 +4,7 @@
 
 #include <functional>
 #include <string>
+#include <tuple>
 #include <vector>
 
 #include "sync/synctool_fixture.h"
@@ -67,30 +68,25 @@ using RunOutcome = SynctoolTest;
 // nothing touched on the player or in the store.
 TEST_F(RunOutcome, RunsThatCannotBeginReportTheirStatusAndTouchNothing) {
   registerClient(kClientID, true, true);
-  const struct {
-    const char* name;
-    std::function<void()> arrange;
-    std::string clientID;
-    std::int64_t status;
-    const char* line;
-  } cases[] = {
-      {"no matching player", [&] { setPlayers({Player("BEEF")}); }, std::string(kClientID), 3,
-       "Can't find Zeto"},
-      {"unknown client", [&] { setPlayers({Player(std::string(kPlayerID))}); },
-       "0000000A27001A2B3C4D", 0, "Can't get a sync client"},
-      {"store that cannot be opened",
-       [&] { setEnvironment("TESSEL_STORE", (folder() / "missing" / "truth.db").string()); },
-       std::string(kClientID), 2, "Exception while getting sync client:\nTesselStoreException"},
-  };
-  for (const auto& c : cases) {
-    SCOPED_TRACE(c.name);
-    c.arrange();
-    const SynctoolRun run = syncClient(c.clientID);
+  const std::tuple<std::string, std::function<void()>, std::string, std::int64_t, std::string>
+      cases[] = {
+          {"no matching player", [&] { setPlayers({Player("BEEF")}); }, std::string(kClientID), 3,
+           "Can't find Zeto"},
+          {"unknown client", [&] { setPlayers({Player(std::string(kPlayerID))}); },
+           "0000000A27001A2B3C4D", 0, "Can't get a sync client"},
+          {"store that cannot be opened",
+           [&] { setEnvironment("TESSEL_STORE", (folder() / "missing" / "truth.db").string()); },
+           std::string(kClientID), 2, "Exception while getting sync client:\nTesselStoreException"},
+      };
+  for (const auto& [name, arrange, clientID, status, line] : cases) {
+    SCOPED_TRACE(name);
+    arrange();
+    const SynctoolRun run = syncClient(clientID);
     EXPECT_EQ(run.exitStatus, 0);
-    EXPECT_TRUE(run.logContains(c.line)) << run.log;
+    EXPECT_TRUE(run.logContains(line)) << run.log;
     EXPECT_EQ(run.notifications,
-              (std::vector<Json>{expectedNotification(c.clientID, kConnecting, 0),
-                                 expectedNotification(c.clientID, kDisconnecting, 100, c.status)}));
+              (std::vector<Json>{expectedNotification(clientID, kConnecting, 0),
+                                 expectedNotification(clientID, kDisconnecting, 100, status)}));
     EXPECT_FALSE(run.logged("Locking Zeto"));
     EXPECT_FALSE(fs::exists(volume() / "Contacts"));
   }

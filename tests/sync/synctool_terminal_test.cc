@@ -4,6 +4,8 @@
 #include <gtest/gtest.h>
 
 #include <string>
+#include <tuple>
+#include <utility>
 #include <vector>
 
 #include "support/files.h"
@@ -25,38 +27,25 @@ class OnTerminal : public SynctoolTest {
         {"/usr/bin/script", "-qec", std::string(ZETOSYNCTOOL_TEST_BINARY) + " " + arguments,
          "/dev/null"},
         options);
-    std::string shown;
-    for (char c : run.out) {
-      if (c != '\r') shown += c;
-    }
+    std::string shown = run.out;
+    std::erase(shown, '\r');
     return {run.status, shown};
   }
   void importSamples() {
-    ASSERT_EQ(runTessel({"import", "vcard",
-                         (kSamples / "contacts" / "friends-and-colleagues.vcf").string()})
-                  .status,
-              0);
-    ASSERT_EQ(runTessel({"import", "ical", (kSamples / "calendars" / "work.ics").string(),
-                         (kSamples / "calendars" / "home.ics").string()})
-                  .status,
-              0);
+    tessel({"import", "vcard", (kSamples / "contacts" / "friends-and-colleagues.vcf").string()});
+    tessel({"import", "ical", (kSamples / "calendars" / "work.ics").string(),
+            (kSamples / "calendars" / "home.ics").string()});
   }
 };
 
 TEST_F(OnTerminal, BadArgumentsShowTheUsageAndTheVersionButKeepTheirStatusAndLog) {
-  struct Case {
-    std::string arguments;
-    std::string shown;
-  };
-  const std::vector<Case> cases = {
+  const std::pair<std::string, std::string> cases[] = {
       {"", "usage: zetosynctool --oneshot --sync <sync_client_id>\n"},
       {"--version", "zetosynctool 38\nusage: zetosynctool --oneshot --sync <sync_client_id>\n"},
   };
-  for (const Case& c : cases) {
-    SCOPED_TRACE(c.arguments);
-    const auto [status, shown] = runOnTerminal(c.arguments);
-    EXPECT_EQ(status, 1);
-    EXPECT_EQ(shown, c.shown);
+  for (const auto& [arguments, expected] : cases) {
+    SCOPED_TRACE(arguments);
+    EXPECT_EQ(runOnTerminal(arguments), std::pair(1, expected));
   }
   // Off a terminal nothing changes: the usage line is in the log only.
   const SynctoolRun run = runSynctool({"--version"});
@@ -67,30 +56,22 @@ TEST_F(OnTerminal, BadArgumentsShowTheUsageAndTheVersionButKeepTheirStatusAndLog
 
 TEST_F(OnTerminal, ARunEndsWithItsOutcomeAndWhatWasWritten) {
   importSamples();
-  ASSERT_EQ(
-      runTessel({"client", "register", std::string(kClientID), "--contacts", "--calendars"}).status,
-      0);
+  tessel({"client", "register", std::string(kClientID), "--contacts", "--calendars"});
   const std::string sync = "--oneshot --sync " + std::string(kClientID);
 
-  auto [status, shown] = runOnTerminal(sync);
-  EXPECT_EQ(status, 0);
-  EXPECT_EQ(shown, "zetosynctool: synced: Contacts/Tessel.vcf (26 contacts), 2 calendars\n");
+  EXPECT_EQ(runOnTerminal(sync),
+            std::pair(0, std::string("zetosynctool: synced: Contacts/Tessel.vcf (26 contacts), "
+                                     "2 calendars\n")));
 
   // Nothing changed: the contacts file stays, the calendars are written again.
-  std::tie(status, shown) = runOnTerminal(sync);
-  EXPECT_EQ(shown, "zetosynctool: synced: 2 calendars\n");
+  EXPECT_EQ(runOnTerminal(sync).second, "zetosynctool: synced: 2 calendars\n");
 
   // Off a terminal, the same run says nothing.
   syncClient(kClientID);
   EXPECT_EQ(zt::test_support::readFile(folder() / "stderr.txt"), "");
 
   const std::string store = (folder() / "truth.db").string();
-  struct Failure {
-    std::string client;
-    std::vector<Player> players;
-    std::string shown;
-  };
-  const std::vector<Failure> failures = {
+  const std::tuple<std::string, std::vector<Player>, std::string> failures[] = {
       {"nobody",
        {Player(std::string(kPlayerID))},
        "zetosynctool: success, but nothing was written: no sync client nobody in the store " +
@@ -100,17 +81,15 @@ TEST_F(OnTerminal, ARunEndsWithItsOutcomeAndWhatWasWritten) {
        "zetosynctool: player unavailable: no connected player matches " + std::string(kClientID) +
            " (tessel devices lists them), or another sync holds it\n"},
   };
-  for (const Failure& f : failures) {
-    SCOPED_TRACE(f.client);
-    setPlayers(f.players);
-    std::tie(status, shown) = runOnTerminal("--oneshot --sync " + f.client);
-    EXPECT_EQ(status, 0);
-    EXPECT_EQ(shown, f.shown);
+  for (const auto& [client, players, expected] : failures) {
+    SCOPED_TRACE(client);
+    setPlayers(players);
+    EXPECT_EQ(runOnTerminal("--oneshot --sync " + client), std::pair(0, expected));
   }
   setEnvironment("TESSEL_STORE", (folder() / "elsewhere.db").string());
-  std::tie(status, shown) = runOnTerminal(sync);
-  EXPECT_EQ(shown, "zetosynctool: error: no store at " + (folder() / "elsewhere.db").string() +
-                       " (create it with tessel init, or set TESSEL_STORE)\n");
+  EXPECT_EQ(runOnTerminal(sync).second, "zetosynctool: error: no store at " +
+                                            (folder() / "elsewhere.db").string() +
+                                            " (create it with tessel init, or set TESSEL_STORE)\n");
 }
 
 }  // namespace

@@ -199,10 +199,9 @@ TEST_F(SessionChanges, StreamedAndBatchedReadsAnswerWhatTheMapsAnswer) {
   std::vector<std::string> identifiers{"nope", "g1"};
   for (int i = 0; i < 300; ++i) {
     Record record = contact("c" + std::to_string(i), i % 2 ? "Ann" : "Bob", {"g1"});
-    if (i % 3 == 0) {
+    if (i % 3 == 0)
       record.record.set(std::string(TesselAttribute_Contacts_Contact_Image),
                         Value(zt::platform::Data(1000, static_cast<std::uint8_t>(i))));
-    }
     records.push_back(std::move(record));
     identifiers.push_back("c" + std::to_string(299 - i));
     if (i % 7 == 0) identifiers.push_back("c" + std::to_string(i));  // asked twice

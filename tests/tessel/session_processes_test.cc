@@ -42,10 +42,9 @@ int runChildJob(const std::string& job) {
     int signalFd = std::stoi(args.at(2));
     for (int batch = 0;; ++batch) {
       std::vector<Record> records;
-      for (std::size_t i = 0; i < kChurnBatch; ++i) {
+      for (std::size_t i = 0; i < kChurnBatch; ++i)
         records.push_back(
             contact(std::to_string(batch) + "-" + std::to_string(i), std::string(200, 'x')));
-      }
       store->putRecords(records);
       if (batch == 0) {
         char ready = 1;

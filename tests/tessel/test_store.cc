@@ -60,9 +60,8 @@ std::vector<std::string> summary(const std::vector<Change>& changes) {
 void NameFilter::registerClass() {
   FilterRegistry::shared().registerClass(kClassName, [](Decoder& decoder) {
     std::vector<std::string> refused;
-    for (const auto& element : decoder.decodeElements()) {
+    for (const auto& element : decoder.decodeElements())
       refused.push_back(std::get<std::string>(element));
-    }
     return std::make_shared<NameFilter>(std::move(refused));
   });
 }

@@ -4,6 +4,8 @@
 
 #include <algorithm>
 #include <string>
+#include <tuple>
+#include <utility>
 #include <vector>
 
 #include "support/files.h"
@@ -20,10 +22,8 @@ class ClientChoices : public TesselCommandTest {
   void SetUp() override {
     TesselCommandTest::SetUp();
     ASSERT_EQ(tessel({"init"}).status, 0);
-    ASSERT_EQ(
-        tessel({"import", "vcard", (kSamples / "contacts" / "friends-and-colleagues.vcf").string()})
-            .status,
-        0);
+    const fs::path vcf = kSamples / "contacts/friends-and-colleagues.vcf";
+    ASSERT_EQ(tessel({"import", "vcard", vcf.string()}).status, 0);
     // Calendars of truth with known identifiers, as another source would put them.
     std::string lines;
     for (const auto& [id, title] : std::vector<std::pair<std::string, std::string>>{
@@ -45,38 +45,30 @@ TEST_F(ClientChoices, CalendarOrderListsEveryCalendarTheNamedOnesFirst) {
   ASSERT_EQ(tessel({"calendars", "order", "Work"}).status, 0);
   EXPECT_EQ(order(), kWork + "\tWork\n" + kHolidays + "\tHolidays\n" + kHome + "\tHome\n");
   // A calendar imported later is appended.
-  ASSERT_EQ(tessel({"import", "ical", (kSamples / "calendars" / "home.ics").string(), "--title",
-                    "Imported"})
-                .status,
-            0);
+  const fs::path ics = kSamples / "calendars/home.ics";
+  ASSERT_EQ(tessel({"import", "ical", ics.string(), "--title", "Imported"}).status, 0);
   const std::string listed = order();
   EXPECT_EQ(listed.rfind(kWork + "\tWork\n" + kHolidays + "\tHolidays\n" + kHome + "\tHome\n", 0),
             0u)
       << listed;
   EXPECT_EQ(std::count(listed.begin(), listed.end(), '\n'), 4) << listed;
   // Bad words change nothing.
-  const struct {
-    std::vector<std::string> args;
-    const char* says;
-  } refused[] = {
+  const std::pair<std::vector<std::string>, std::string> refused[] = {
       {{"calendars", "order", "Nowhere"}, "\"Nowhere\" is not a calendar of the store"},
       {{"calendars", "order", "H"}, "\"H\" names more than one calendar: "},
       {{"calendars", "order", "Work", kWork}, "calendar \"ical-work\" is named twice"},
   };
-  for (const auto& r : refused) {
-    const Outcome run = tessel(r.args);
+  for (const auto& [args, says] : refused) {
+    const Outcome run = tessel(args);
     EXPECT_EQ(run.status, 2);
-    EXPECT_CONTAINS(run.err, r.says);
+    EXPECT_CONTAINS(run.err, says);
   }
   EXPECT_EQ(order(), listed);
 }
 
 TEST_F(ClientChoices, RegisterKeepsTheDataClassesItDoesNotMention) {
-  const struct {
-    std::vector<std::string> args;
-    int status;
-    const char* classes;  // as `client list` shows them afterwards
-  } steps[] = {
+  // The options after "client register c", the status, and `client list` afterwards.
+  const std::tuple<std::vector<std::string>, int, std::string> steps[] = {
       {{"--name", "Kitchen"}, 2, "no client"},  // a new client for nothing is refused
       {{"--contacts", "--calendars"}, 0, "c\tc\tcontacts, calendars\n"},
       {{"--name", "Kitchen"}, 0, "c\tKitchen\tcontacts, calendars\n"},
@@ -86,18 +78,18 @@ TEST_F(ClientChoices, RegisterKeepsTheDataClassesItDoesNotMention) {
       {{"--calendars"}, 0, "c\tKitchen\tcalendars\n"},
       {{"--contacts", "--no-contacts"}, 2, "c\tKitchen\tcalendars\n"},
   };
-  for (const auto& step : steps) {
-    SCOPED_TRACE(::testing::PrintToString(step.args));
+  for (const auto& [options, status, classes] : steps) {
+    SCOPED_TRACE(::testing::PrintToString(options));
     std::vector<std::string> args = {"client", "register", "c"};
-    args.insert(args.end(), step.args.begin(), step.args.end());
+    args.insert(args.end(), options.begin(), options.end());
     const Outcome run = tessel(args);
-    EXPECT_EQ(run.status, step.status) << run.err;
+    EXPECT_EQ(run.status, status) << run.err;
     const std::string listed = tessel({"client", "list"}).out;
-    if (std::string(step.classes) == "no client") {
+    if (classes == "no client") {
       EXPECT_CONTAINS(run.err, "would sync nothing");
       EXPECT_CONTAINS(listed, "no clients");
     } else {
-      EXPECT_EQ(listed, step.classes);
+      EXPECT_EQ(listed, classes);
     }
   }
 }
@@ -107,11 +99,7 @@ TEST_F(ClientChoices, FiltersTakeNamesAndShowThem) {
   EXPECT_EQ(tessel({"groups", "list"}).out,
             "vcard-group/Book club\tBook club\nvcard-group/Family\tFamily\nvcard-group/"
             "Friends\tFriends\nvcard-group/Work\tWork\n");
-  const struct {
-    std::vector<std::string> args;
-    int status;
-    const char* says;
-  } cases[] = {
+  const std::tuple<std::vector<std::string>, int, std::string> cases[] = {
       {{"contacts", "--groups", "Fam,Book club"}, 0, "syncs 2 contact group(s)"},
       {{"contacts", "--groups", "F"},
        2,
@@ -122,15 +110,14 @@ TEST_F(ClientChoices, FiltersTakeNamesAndShowThem) {
       // "Work" is a group's name too, but here only calendars count.
       {{"calendars", "--calendars", "Family"}, 2, "\"Family\" is not a calendar"},
   };
-  for (const auto& c : cases) {
+  for (const auto& [options, status, says] : cases) {
     std::vector<std::string> args = {"client", "filter", "c"};
-    args.insert(args.end(), c.args.begin(), c.args.end());
+    args.insert(args.end(), options.begin(), options.end());
     const Outcome run = tessel(args);
-    EXPECT_EQ(run.status, c.status) << run.err;
-    EXPECT_CONTAINS(run.out + run.err, c.says);
+    EXPECT_EQ(run.status, status) << run.err;
+    EXPECT_CONTAINS(run.out + run.err, says);
   }
-  const std::string shown = tessel({"client", "show", "c"}).out;
-  EXPECT_CONTAINS(shown,
+  EXPECT_CONTAINS(tessel({"client", "show", "c"}).out,
                   "filters:\n  contacts: the members of Family (vcard-group/Family), "
                   "Book club (vcard-group/Book club)\n  calendars: Work (ical-work), "
                   "Home (ical-home)\n");

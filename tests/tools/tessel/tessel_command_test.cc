@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <string>
+#include <tuple>
 #include <utility>
 #include <vector>
 
@@ -137,8 +138,8 @@ TEST_F(TesselCommand, ClientFiltersSelectExistingGroupsAndCalendarsOnly) {
   EXPECT_EQ(tessel({"client", "filter", "c", "calendars", "--all", "--calendars", "cal-1"}).status,
             2);
   EXPECT_EQ(tessel({"client", "filter", "ghost", "contacts", "--all"}).status, 1);
-  const std::string shown = tessel({"client", "show", "c"}).out;
-  EXPECT_CONTAINS(shown, "filters:\n  contacts: all contacts\n  calendars: Work (cal-1)\n");
+  EXPECT_CONTAINS(tessel({"client", "show", "c"}).out,
+                  "filters:\n  contacts: all contacts\n  calendars: Work (cal-1)\n");
 }
 
 TEST_F(TesselCommand, DevicesListsThePlayersWithTheirSuggestedClients) {
@@ -170,12 +171,7 @@ TEST_F(TesselCommand, DevicesListsThePlayersWithTheirSuggestedClients) {
 // Failures exit with 1, usage errors with 2, both saying why on standard error; none of
 // them makes a store.
 TEST_F(TesselCommand, FailuresAndUsageErrorsExitWithTheirStatusAndSayWhy) {
-  const struct {
-    bool storeExists;
-    std::vector<std::string> args;
-    int status;
-    const char* says;
-  } cases[] = {
+  const std::tuple<bool, std::vector<std::string>, int, std::string> cases[] = {
       {true, {"client", "show", "ghost"}, 1, "ghost"},
       {true, {"session", "cancel", "ghost"}, 1, "ghost"},
       {false, {"records", "list"}, 1, "tessel: "},
@@ -183,16 +179,16 @@ TEST_F(TesselCommand, FailuresAndUsageErrorsExitWithTheirStatusAndSayWhy) {
       {false, {"records", "list", "--colour"}, 2, "tessel: "},
       {false, {"client", "set", "c", "K"}, 2, "tessel: "},
   };
-  for (const auto& c : cases) {
-    SCOPED_TRACE(::testing::PrintToString(c.args));
+  for (const auto& [storeExists, args, status, says] : cases) {
+    SCOPED_TRACE(::testing::PrintToString(args));
     for (const char* end : {"", "-wal", "-shm"}) fs::remove(store_.string() + end);
-    if (c.storeExists) {
+    if (storeExists) {
       ASSERT_EQ(tessel({"init"}).status, 0);
     }
-    const Outcome run = tessel(c.args);
-    EXPECT_EQ(run.status, c.status);
-    EXPECT_CONTAINS(run.err, c.says);
-    EXPECT_EQ(fs::exists(store_), c.storeExists);
+    const Outcome run = tessel(args);
+    EXPECT_EQ(run.status, status);
+    EXPECT_CONTAINS(run.err, says);
+    EXPECT_EQ(fs::exists(store_), storeExists);
   }
   for (const std::vector<std::string>& args : std::vector<std::vector<std::string>>{
            {TESSEL_BINARY, "--help"}, {TESSEL_BINARY, "records", "put", "--help"}}) {
