@@ -8,9 +8,7 @@ root=$(cd "$(dirname "$0")/.." && pwd)
 build=${1:-$root/build/default}
 verbose=${2:-}
 corpus=${ZT_CORPUS:-$root/../shared/realworld-corpus.tar.xz}
-# A worktree under wt/ sits one level deeper than the repository.
-[ -f "$corpus" ] || corpus=$root/../../shared/realworld-corpus.tar.xz
 work=$(mktemp -d)
 trap 'rm -rf "$work"' EXIT
 tar -xJf "$corpus" -C "$work"
-find "$work" -name '*.ics' -print0 | xargs -0 "$build/tests/importers/ical_zone_census" $verbose
+find "$work" -name '*.ics' -print0 | xargs -0 "$build/bench/ical_zone_census" $verbose
