@@ -10,7 +10,7 @@
 
 #include "platform/log.h"
 #include "support/captured_log.h"
-#include "support/picture_maker.h"
+#include "support/test_picture.h"
 #include "tessel/schema.h"
 
 namespace zt::contacts {
@@ -18,14 +18,9 @@ namespace {
 
 using platform::Data;
 using platform::PixelSize;
+using test_support::picture;
 using test_support::PictureFormat;
 using test_support::PicturePattern;
-
-Data picture(test_support::PictureRecipe recipe) {
-  std::optional<Data> bytes = test_support::makePicture(recipe);
-  EXPECT_TRUE(bytes) << "libvips could not make the test picture";
-  return bytes.value_or(Data{});
-}
 
 // A small valid JPEG grown to `size` bytes with data after its end marker, which decoders
 // ignore.

@@ -10,8 +10,8 @@
 
 #include "contacts/contact_photo.h"
 #include "support/captured_log.h"
-#include "support/picture_maker.h"
 #include "support/temporary_folder.h"
+#include "support/test_picture.h"
 #include "tessel/schema.h"
 
 namespace zt::contacts {
@@ -19,14 +19,9 @@ namespace {
 
 namespace fs = std::filesystem;
 using platform::Data;
+using test_support::picture;
 using test_support::PictureFormat;
 using test_support::PicturePattern;
-
-Data picture(test_support::PictureRecipe recipe) {
-  std::optional<Data> bytes = test_support::makePicture(recipe);
-  EXPECT_TRUE(bytes) << "libvips could not make the test picture";
-  return bytes.value_or(Data{});
-}
 
 platform::Dictionary contact(std::string name, Data image) {
   return platform::Dictionary{
