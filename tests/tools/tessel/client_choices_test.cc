@@ -100,6 +100,7 @@ TEST_F(ClientChoices, FiltersTakeNamesAndShowThem) {
             "vcard-group/Book club\tBook club\nvcard-group/Family\tFamily\nvcard-group/"
             "Friends\tFriends\nvcard-group/Work\tWork\n");
   const std::tuple<std::vector<std::string>, int, std::string> cases[] = {
+      {{"contacts", "--all"}, 0, ""},  // replaced by the next line, not added to
       {{"contacts", "--groups", "Fam,Book club"}, 0, "syncs 2 contact group(s)"},
       {{"contacts", "--groups", "F"},
        2,
@@ -109,6 +110,7 @@ TEST_F(ClientChoices, FiltersTakeNamesAndShowThem) {
       {{"calendars", "--calendars", "Work," + kHome}, 0, "syncs 2 calendar(s)"},
       // "Work" is a group's name too, but here only calendars count.
       {{"calendars", "--calendars", "Family"}, 2, "\"Family\" is not a calendar"},
+      {{"calendars", "--all", "--calendars", "Home"}, 2, "tessel: "},
   };
   for (const auto& [options, status, says] : cases) {
     std::vector<std::string> args = {"client", "filter", "c"};
@@ -117,6 +119,7 @@ TEST_F(ClientChoices, FiltersTakeNamesAndShowThem) {
     EXPECT_EQ(run.status, status) << run.err;
     EXPECT_CONTAINS(run.out + run.err, says);
   }
+  EXPECT_EQ(tessel({"client", "filter", "ghost", "contacts", "--all"}).status, 1);
   EXPECT_CONTAINS(tessel({"client", "show", "c"}).out,
                   "filters:\n  contacts: the members of Family (vcard-group/Family), "
                   "Book club (vcard-group/Book club)\n  calendars: Work (ical-work), "

@@ -123,25 +123,6 @@ TEST_F(TesselCommand, ClientSettingsAreSetShownAndUnset) {
   EXPECT_CONTAINS(run.out, "no session");
 }
 
-TEST_F(TesselCommand, ClientFiltersSelectExistingGroupsAndCalendarsOnly) {
-  ASSERT_EQ(tessel({"init"}).status, 0);
-  put(kCalendar + "\n" +
-      R"({"id":"g-1","record":{"tessel.record.entity":"tessel.contacts.Group","name":"Family"}})" +
-      "\n");
-  ASSERT_EQ(tessel({"client", "register", "c", "--contacts", "--calendars"}).status, 0);
-  ASSERT_EQ(tessel({"client", "filter", "c", "contacts", "--groups", "g-1"}).status, 0);
-  ASSERT_EQ(tessel({"client", "filter", "c", "calendars", "--calendars", "cal-1"}).status, 0);
-  // Setting the contacts again replaces the earlier contact filter instead of adding one.
-  ASSERT_EQ(tessel({"client", "filter", "c", "contacts", "--all"}).status, 0);
-  // A group given as a calendar, or both --all and a list: usage errors that change nothing.
-  EXPECT_EQ(tessel({"client", "filter", "c", "calendars", "--calendars", "g-1"}).status, 2);
-  EXPECT_EQ(tessel({"client", "filter", "c", "calendars", "--all", "--calendars", "cal-1"}).status,
-            2);
-  EXPECT_EQ(tessel({"client", "filter", "ghost", "contacts", "--all"}).status, 1);
-  EXPECT_CONTAINS(tessel({"client", "show", "c"}).out,
-                  "filters:\n  contacts: all contacts\n  calendars: Work (cal-1)\n");
-}
-
 TEST_F(TesselCommand, DevicesListsThePlayersWithTheirSuggestedClients) {
   zt::test_support::ScopedEnvironment environment;
   environment.set("ZETO_VIRTUAL_DEVICES", (dir_ / "players.json").string());
