@@ -82,8 +82,9 @@ zt::platform::Result<void> checkDownload(const HttpResponse& response, Collectio
       response.body.find_first_not_of(" \r\n") == std::string::npos)
     return {};
   if (!found)
-    return Error{response.finalUrl + ": what the server sent is not " + wanted +
-                 (expected == Collection::Calendar ? " (no BEGIN:VCALENDAR)" : " (no BEGIN:VCARD)")};
+    return Error{
+        response.finalUrl + ": what the server sent is not " + wanted +
+        (expected == Collection::Calendar ? " (no BEGIN:VCALENDAR)" : " (no BEGIN:VCARD)")};
   if (*found != expected)
     return Error{response.finalUrl + ": the server sent " + withArticle(*found) +
                  ", but the source is " + wanted};

@@ -27,8 +27,7 @@ Result<BasicCredentials> readCredentials(const fs::path& file) {
   if (!line.empty() && line.back() == '\r') line.pop_back();
   const std::size_t colon = line.find(':');
   if (colon == std::string::npos || colon == 0)
-    return Error{"credentials file " + file.string() +
-                 ": its first line must be USER:PASSWORD"};
+    return Error{"credentials file " + file.string() + ": its first line must be USER:PASSWORD"};
   return BasicCredentials{line.substr(0, colon), line.substr(colon + 1)};
 }
 

@@ -12,7 +12,8 @@ namespace {
 constexpr std::size_t kLargest = std::size_t{16} << 20;
 }  // namespace
 
-zt::platform::Result<std::optional<nlohmann::json>> readJsonFile(const std::filesystem::path& file) {
+zt::platform::Result<std::optional<nlohmann::json>> readJsonFile(
+    const std::filesystem::path& file) {
   std::error_code error;
   if (!std::filesystem::exists(file, error)) return std::optional<nlohmann::json>();
   auto folder = zt::platform::FolderHandle::open(file.parent_path());

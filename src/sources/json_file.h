@@ -1,9 +1,8 @@
 #pragma once
 
 #include <filesystem>
-#include <optional>
-
 #include <nlohmann/json.hpp>
+#include <optional>
 
 #include "platform/result.h"
 

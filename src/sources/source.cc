@@ -37,8 +37,8 @@ nlohmann::json toJson(const Source& source) {
 
 Result<Source> fromJson(const nlohmann::json& json) {
   if (!json.is_object() || !json.contains("id") || !json["id"].is_string() ||
-      !json.contains("location") || !json["location"].is_string() ||
-      !json.contains("collection") || !json["collection"].is_string())
+      !json.contains("location") || !json["location"].is_string() || !json.contains("collection") ||
+      !json["collection"].is_string())
     return Error{"a source without id, location or collection"};
   Source source;
   source.identifier = json["id"].get<std::string>();

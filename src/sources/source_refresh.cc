@@ -40,7 +40,8 @@ Result<Download> download(const Source& source, const SourceState& previous, Htt
   }
   auto response = http.get(source.location, credentials, previous.validators);
   if (!response) return Error{response.error()};
-  if (response->freshness == Freshness::NotModified) return Download{std::nullopt, previous.validators};
+  if (response->freshness == Freshness::NotModified)
+    return Download{std::nullopt, previous.validators};
   if (auto checked = checkDownload(*response, source.collection); !checked)
     return Error{checked.error()};
   return Download{std::move(response->body), std::move(response->validators)};
@@ -52,8 +53,7 @@ std::string titleOfAddress(const std::string& address) {
   std::string path = address.substr(0, address.find_first_of("?#"));
   while (!path.empty() && path.back() == '/') path.pop_back();
   std::string last = path.substr(path.find_last_of('/') + 1);
-  if (const std::size_t dot = last.rfind('.'); dot != std::string::npos && dot > 0)
-    last.erase(dot);
+  if (const std::size_t dot = last.rfind('.'); dot != std::string::npos && dot > 0) last.erase(dot);
   return last.empty() ? address : last;
 }
 
@@ -61,8 +61,7 @@ std::string counted(std::size_t count, const char* one, const char* many) {
   return std::to_string(count) + " " + (count == 1 ? one : many);
 }
 
-std::string refreshCalendar(Store& store, const Source& source,
-                                    std::optional<std::string> text) {
+std::string refreshCalendar(Store& store, const Source& source, std::optional<std::string> text) {
   std::vector<importers::ICalCalendar> calendars;
   if (text) {
     importers::ICalCalendarSource read;
@@ -123,9 +122,8 @@ std::vector<std::string> staleRecords(const Store& store, const std::vector<std:
 }
 
 std::string refreshAddressBook(Store& store, const Source& source,
-                                       const std::vector<Source>& sources,
-                                       const SourceStates& states, std::optional<std::string> text,
-                                       SourceState& state) {
+                               const std::vector<Source>& sources, const SourceStates& states,
+                               std::optional<std::string> text, SourceState& state) {
   importers::VCardImport import;
   if (text)
     import.addText(*text, source.location);
@@ -138,8 +136,7 @@ std::string refreshAddressBook(Store& store, const Source& source,
       continue;
     for (std::string& id : states.load(other).records) elsewhere.insert(std::move(id));
   }
-  const importers::VCardImportSummary summary =
-      std::move(import).writeTo(store, SyncDeletes::Off);
+  const importers::VCardImportSummary summary = std::move(import).writeTo(store, SyncDeletes::Off);
   const std::size_t deleted =
       store.deleteRecords(staleRecords(store, state.records, produced, elsewhere));
   state.records = produced;

@@ -25,8 +25,9 @@ RefreshOutcome refreshSources(CommandContext& context) {
         if (refresh.result == sources::RefreshResult::Failed) {
           ++outcome.failed;
           context.out().flush();
-          std::cerr << "tessel: source " << source.identifier << " (" << source.location
-                    << "): " << refresh.detail << "; the store keeps what it had from it\n";
+          // The reason names the address, file or credentials file at fault.
+          std::cerr << "tessel: source " << source.identifier << ": " << refresh.detail
+                    << "; the store keeps what it had from it\n";
           return;
         }
         ++(refresh.result == sources::RefreshResult::Imported ? outcome.imported

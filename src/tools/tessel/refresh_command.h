@@ -17,7 +17,7 @@ struct RefreshOutcome {
 // `tessel refresh` (and the first step of a sync): brings every source of `tessel source list`
 // into the store. One line per source on standard output as it ends ("1 calendar LOCATION:
 // ..."); a source that cannot be read keeps what the store had from it, and the reason goes to
-// standard error ("tessel: source 2 (LOCATION): ...; the store keeps what it had from it"),
+// standard error ("tessel: source 2: LOCATION: ...; the store keeps what it had from it"),
 // after which the other sources go on. The command exits 1 when any source failed.
 RefreshOutcome refreshSources(CommandContext& context);
 

@@ -53,8 +53,8 @@ void addSourceCommands(CLI::App& app, CommandLine& line) {
   auto* list = source->add_subcommand("list", "The sources: identifier, collection, location");
   list->callback([&line] { line.command = [](CommandContext& context) { listSources(context); }; });
 
-  auto* remove = source->add_subcommand(
-      "remove", "Forget a source (what it brought stays in the store)");
+  auto* remove =
+      source->add_subcommand("remove", "Forget a source (what it brought stays in the store)");
   remove->add_option("SOURCE", options->removed, "Identifier or location")->required();
   remove->callback([&line, options] {
     line.command = [options](CommandContext& context) { removeSource(context, options->removed); };

@@ -31,8 +31,9 @@ void refuseUserInAddress(const std::string& address) {
   const std::size_t start = address.find("://") + 3;
   const std::string authority = address.substr(start, address.find_first_of("/?#", start) - start);
   if (authority.find('@') != std::string::npos)
-    throw UsageError("the address carries a user name: put USER:PASSWORD in a file only you "
-                     "can read and name it with --credentials");
+    throw UsageError(
+        "the address carries a user name: put USER:PASSWORD in a file only you "
+        "can read and name it with --credentials");
 }
 
 Collection collectionOfAddress(const Source& source) {
@@ -91,8 +92,9 @@ void addSource(CommandContext& context, const std::string& location,
   } else if (auto found = sources::collectionOfPath(source.location)) {
     source.collection = *found;
   } else {
-    throw std::runtime_error(location + ": cannot tell what it holds; say --calendar or "
-                                        "--address-book");
+    throw std::runtime_error(location +
+                             ": cannot tell what it holds; say --calendar or "
+                             "--address-book");
   }
   const Source& added = list.add(std::move(source));
   if (auto saved = list.save(); !saved) throw std::runtime_error(saved.error());
@@ -104,8 +106,8 @@ void addSource(CommandContext& context, const std::string& location,
 void listSources(CommandContext& context) {
   const SourceList list = loadList();
   for (const Source& source : list.sources()) {
-    context.out() << source.identifier << '\t' << sources::collectionName(source.collection)
-                  << '\t' << source.location;
+    context.out() << source.identifier << '\t' << sources::collectionName(source.collection) << '\t'
+                  << source.location;
     if (source.title) context.out() << "\ttitle: " << *source.title;
     if (source.credentialsFile)
       context.out() << "\tcredentials: " << source.credentialsFile->string();
@@ -116,7 +118,8 @@ void listSources(CommandContext& context) {
 void removeSource(CommandContext& context, const std::string& identifierOrLocation) {
   SourceList list = loadList();
   const std::optional<Source> removed = list.remove(identifierOrLocation);
-  if (!removed) throw std::runtime_error("no source " + identifierOrLocation + " (tessel source list)");
+  if (!removed)
+    throw std::runtime_error("no source " + identifierOrLocation + " (tessel source list)");
   if (auto saved = list.save(); !saved) throw std::runtime_error(saved.error());
   sources::SourceStates(context.storePath()).forget(*removed);
   context.out() << "removed source " << removed->identifier << " (" << removed->location
