@@ -1,0 +1,224 @@
+// `tessel source add` and `tessel refresh` against real servers on 127.0.0.1: Radicale (a
+// CalDAV/CardDAV server, filled with HTTP PUT and DELETE as any client fills it) and a plain
+// HTTP server of files that the test controls (collection_server.py), each with its own
+// temporary storage and a free port. Skipped where radicale or python3 is not installed
+// (scripts/setup --tests installs them).
+
+#include <arpa/inet.h>
+#include <netinet/in.h>
+#include <sys/socket.h>
+#include <unistd.h>
+
+#include <chrono>
+#include <thread>
+
+#include "support/scoped_environment.h"
+#include "tools/tessel/tessel_command_fixture.h"
+
+namespace {
+
+using namespace tessel::testing;
+using zt::test_support::contains;
+using zt::test_support::splitLines;
+
+constexpr const char* kRadicale = "/usr/bin/radicale";
+constexpr const char* kPython = "/usr/bin/python3";
+
+int freePort() {
+  const int fd = ::socket(AF_INET, SOCK_STREAM, 0);
+  sockaddr_in address{};
+  address.sin_family = AF_INET;
+  address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+  socklen_t length = sizeof address;
+  ::bind(fd, reinterpret_cast<sockaddr*>(&address), sizeof address);
+  ::getsockname(fd, reinterpret_cast<sockaddr*>(&address), &length);
+  ::close(fd);
+  return ntohs(address.sin_port);
+}
+
+bool accepts(int port) {
+  const int fd = ::socket(AF_INET, SOCK_STREAM, 0);
+  sockaddr_in address{};
+  address.sin_family = AF_INET;
+  address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+  address.sin_port = htons(static_cast<std::uint16_t>(port));
+  const bool connected = ::connect(fd, reinterpret_cast<sockaddr*>(&address), sizeof address) == 0;
+  ::close(fd);
+  return connected;
+}
+
+std::string event(const std::string& uid, const std::string& summary) {
+  return "BEGIN:VCALENDAR\r\nVERSION:2.0\r\nPRODID:-//test//EN\r\nBEGIN:VEVENT\r\nUID:" + uid +
+         "\r\nDTSTAMP:20260101T000000Z\r\nDTSTART:20260102T100000Z\r\nSUMMARY:" + summary +
+         "\r\nEND:VEVENT\r\nEND:VCALENDAR\r\n";
+}
+
+std::string card(const std::string& uid, const std::string& name) {
+  return "BEGIN:VCARD\r\nVERSION:3.0\r\nUID:" + uid + "\r\nFN:" + name + "\r\nN:" + name +
+         ";;;;\r\nEND:VCARD\r\n";
+}
+
+class SourceRefresh : public TesselCommandTest {
+ protected:
+  void SetUp() override {
+    TesselCommandTest::SetUp();
+    for (const char* program : {kRadicale, kPython})
+      if (!fs::exists(program)) GTEST_SKIP() << program << " is not installed";
+    environment_.set("XDG_CONFIG_HOME", (dir_ / "config").string());
+    ASSERT_EQ(tessel({"init"}).status, 0);
+    writeCredentials("alice:secret");
+  }
+
+  void writeCredentials(const std::string& line) {
+    writeFile(credentials_, line + "\n");
+    fs::permissions(credentials_, fs::perms::owner_read | fs::perms::owner_write);
+  }
+
+  // Waits for a server to take connections on `port`.
+  static ::testing::AssertionResult listening(int port) {
+    for (int tries = 0; tries < 200; ++tries) {
+      if (accepts(port)) return ::testing::AssertionSuccess();
+      std::this_thread::sleep_for(std::chrono::milliseconds(50));
+    }
+    return ::testing::AssertionFailure() << "nothing listens on port " << port;
+  }
+
+  // One request to Radicale as alice, through python3's own HTTP client: its status.
+  std::string dav(const std::string& method, const std::string& path, const std::string& body = "",
+                  const std::string& type = "text/calendar") {
+    const std::string script =
+        "import base64, sys, urllib.error, urllib.request\n"
+        "method, url, kind = sys.argv[1:4]\n"
+        "data = sys.stdin.buffer.read() or None\n"
+        "request = urllib.request.Request(url, data=data, method=method)\n"
+        "request.add_header('Authorization', 'Basic ' + base64.b64encode(b'alice:secret').decode())\n"
+        "request.add_header('Content-Type', kind)\n"
+        "try:\n  print(urllib.request.urlopen(request).status)\n"
+        "except urllib.error.HTTPError as e:\n  print(e.code)\n";
+    const Outcome run = runRaw({kPython, "-c", script, method, base_ + path, type}, body);
+    return run.out.substr(0, 3);
+  }
+
+  std::size_t count(std::string_view entity) {
+    const Outcome run = tessel({"records", "list", "--entity", std::string(entity)});
+    EXPECT_EQ(run.status, 0) << run.err;
+    return splitLines(run.out).size();
+  }
+
+  zt::test_support::ScopedEnvironment environment_;
+  fs::path credentials_ = dir_ / "credentials";
+  std::string base_;
+};
+
+TEST_F(SourceRefresh, RadicaleCollectionsComeInLeaveTheStoreAndSurviveAWrongPassword) {
+  const int port = freePort();
+  writeFile(dir_ / "users", "alice:secret\n");
+  zt::test_support::BackgroundProcess radicale(
+      {kRadicale, "--config", "", "--server-hosts", "127.0.0.1:" + std::to_string(port),
+       "--storage-filesystem-folder", (dir_ / "collections").string(), "--auth-type",
+       "htpasswd", "--auth-htpasswd-filename", (dir_ / "users").string(),
+       "--auth-htpasswd-encryption", "plain", "--logging-level", "critical"});
+  ASSERT_TRUE(listening(port));
+  base_ = "http://127.0.0.1:" + std::to_string(port) + "/alice/";
+  ASSERT_EQ(dav("MKCALENDAR", "work/"), "201");
+  ASSERT_EQ(dav("MKCOL", "people/",
+                R"(<?xml version="1.0"?><mkcol xmlns="DAV:" xmlns:C="urn:ietf:params:xml:ns:carddav">)"
+                R"(<set><prop><resourcetype><collection/><C:addressbook/></resourcetype></prop></set></mkcol>)",
+                "application/xml"),
+            "201");
+  for (const char* uid : {"e1", "e2"}) ASSERT_EQ(dav("PUT", std::string("work/") + uid + ".ics", event(uid, uid)), "201");
+  for (const char* uid : {"c1", "c2"})
+    ASSERT_EQ(dav("PUT", std::string("people/") + uid + ".vcf", card(uid, uid), "text/vcard"), "201");
+
+  // A credentials file that others can read is refused before anything is downloaded.
+  fs::permissions(credentials_, fs::perms::group_read | fs::perms::others_read,
+                  fs::perm_options::add);
+  Outcome run = tessel({"source", "add", base_ + "work/", "--credentials", credentials_.string()});
+  EXPECT_EQ(run.status, 1);
+  EXPECT_CONTAINS(run.err, "chmod 600");
+  writeCredentials("alice:secret");
+  // What each collection holds is read from it.
+  for (const char* collection : {"work/", "people/"}) {
+    run = tessel({"source", "add", base_ + collection, "--credentials", credentials_.string()});
+    ASSERT_EQ(run.status, 0) << run.err;
+  }
+  run = tessel({"source", "list"});
+  EXPECT_CONTAINS(run.out, "1\tcalendar\t" + base_ + "work/");
+  EXPECT_CONTAINS(run.out, "2\taddress book\t" + base_ + "people/");
+
+  // A card imported by hand is not the source's, and stays whatever the source loses.
+  writeFile(dir_ / "hand.vcf", card("h1", "Hand"));
+  ASSERT_EQ(tessel({"import", "vcard", (dir_ / "hand.vcf").string()}).status, 0);
+  run = tessel({"refresh"});
+  ASSERT_EQ(run.status, 0) << run.err;
+  EXPECT_CONTAINS(run.out, "\"work\": 2 events, 0 tasks");
+  EXPECT_CONTAINS(run.out, "2 contacts, 0 groups");
+  EXPECT_EQ(count("tessel.calendars.Event"), 2u);
+  EXPECT_EQ(count("tessel.contacts.Contact"), 3u);
+
+  // What left the server leaves the store.
+  ASSERT_EQ(dav("DELETE", "work/e2.ics"), "200");
+  ASSERT_EQ(dav("DELETE", "people/c2.vcf"), "200");
+  run = tessel({"refresh"});
+  ASSERT_EQ(run.status, 0) << run.err;
+  EXPECT_EQ(count("tessel.calendars.Event"), 1u);
+  EXPECT_EQ(count("tessel.contacts.Contact"), 2u);
+
+  // A wrong password fails both sources, says why without the password, and keeps the data.
+  writeCredentials("alice:not-the-secret");
+  run = tessel({"refresh"});
+  EXPECT_EQ(run.status, 1);
+  EXPECT_CONTAINS(run.err, "refused the user name or password (HTTP 401)");
+  EXPECT_CONTAINS(run.err, "the store keeps what it had from it");
+  EXPECT_FALSE(contains(run.err + run.out, "not-the-secret"));
+  EXPECT_EQ(count("tessel.calendars.Event"), 1u);
+  EXPECT_EQ(count("tessel.contacts.Contact"), 2u);
+}
+
+TEST_F(SourceRefresh, PlainServerAnswersUnchangedAndABrokenDownloadKeepsTheStore) {
+  const fs::path root = dir_ / "www";
+  fs::create_directories(root);
+  writeFile(root / "home.ics", event("h1", "Dentist"));
+  const fs::path portFile = dir_ / "port";
+  const fs::path requests = dir_ / "requests";
+  zt::test_support::BackgroundProcess server(
+      {kPython, (fs::path(ZT_TEST_DATA_DIR) / "collection_server.py").string(), root.string(),
+       portFile.string(), requests.string()});
+  for (int tries = 0; tries < 200 && !fs::exists(portFile); ++tries)
+    std::this_thread::sleep_for(std::chrono::milliseconds(50));
+  const std::string address = "http://127.0.0.1:" + readFile(portFile) + "/home.ics";
+
+  ASSERT_EQ(tessel({"source", "add", address, "--calendar"}).status, 0);
+  Outcome run = tessel({"refresh"});
+  ASSERT_EQ(run.status, 0) << run.err;
+  EXPECT_CONTAINS(run.out, "\"home\": 1 event, 0 tasks");
+
+  // The second refresh asks only for a changed collection, and the server has none.
+  run = tessel({"refresh"});
+  ASSERT_EQ(run.status, 0) << run.err;
+  EXPECT_CONTAINS(run.out, address + ": not changed since the last refresh");
+  const std::vector<std::string> log = splitLines(readFile(requests));
+  ASSERT_EQ(log.size(), 2u);
+  EXPECT_CONTAINS(log[0], R"("status": 200, "if-none-match": null)");
+  EXPECT_CONTAINS(log[1], R"("status": 304, "if-none-match": "\")");
+
+  // A changed collection that cannot be read keeps what the store had.
+  const std::tuple<std::string, std::string, std::string> broken[] = {
+      {"cut", event("h2", "Gone"), "the download stopped before its end"},
+      {"login", event("h2", "Gone"), "the server sent a web page, not a calendar"},
+      {"", "BEGIN:VCALENDAR\r\nBEGIN:VEVENT\r\n", "home.ics: line 2: "},
+  };
+  for (const auto& [mode, text, message] : broken) {
+    SCOPED_TRACE(message);
+    writeFile(root / "home.ics", text);
+    writeFile(root / "home.ics.mode", mode);
+    run = tessel({"refresh"});
+    EXPECT_EQ(run.status, 1);
+    EXPECT_CONTAINS(run.err, message);
+    const std::string events = tessel({"records", "list", "--entity", "tessel.calendars.Event"}).out;
+    EXPECT_CONTAINS(events, "Dentist");
+    EXPECT_EQ(splitLines(events).size(), 1u);
+  }
+}
+
+}  // namespace
