@@ -88,14 +88,17 @@ class SourceRefresh : public TesselCommandTest {
                   const std::string& type = "text/calendar") {
     const std::string script =
         "import base64, sys, urllib.error, urllib.request\n"
-        "method, url, kind = sys.argv[1:4]\n"
+        "method, url, kind, secret = sys.argv[1:5]\n"
         "data = sys.stdin.buffer.read() or None\n"
         "request = urllib.request.Request(url, data=data, method=method)\n"
-        "request.add_header('Authorization', 'Basic ' + base64.b64encode(b'alice:secret').decode())\n"
+        "user = open(secret, 'rb').read().strip()\n"
+        "request.add_header('Authorization', 'Basic ' + base64.b64encode(user).decode())\n"
         "request.add_header('Content-Type', kind)\n"
         "try:\n  print(urllib.request.urlopen(request).status)\n"
         "except urllib.error.HTTPError as e:\n  print(e.code)\n";
-    const Outcome run = runRaw({kPython, "-c", script, method, base_ + path, type}, body);
+    // The password comes from the credentials file, never from a command line.
+    const Outcome run =
+        runRaw({kPython, "-c", script, method, base_ + path, type, credentials_.string()}, body);
     return run.out.substr(0, 3);
   }
 
@@ -115,20 +118,23 @@ TEST_F(SourceRefresh, RadicaleCollectionsComeInLeaveTheStoreAndSurviveAWrongPass
   writeFile(dir_ / "users", "alice:secret\n");
   zt::test_support::BackgroundProcess radicale(
       {kRadicale, "--config", "", "--server-hosts", "127.0.0.1:" + std::to_string(port),
-       "--storage-filesystem-folder", (dir_ / "collections").string(), "--auth-type",
-       "htpasswd", "--auth-htpasswd-filename", (dir_ / "users").string(),
-       "--auth-htpasswd-encryption", "plain", "--logging-level", "critical"});
+       "--storage-filesystem-folder", (dir_ / "collections").string(), "--auth-type", "htpasswd",
+       "--auth-htpasswd-filename", (dir_ / "users").string(), "--auth-htpasswd-encryption", "plain",
+       "--logging-level", "critical"});
   ASSERT_TRUE(listening(port));
   base_ = "http://127.0.0.1:" + std::to_string(port) + "/alice/";
   ASSERT_EQ(dav("MKCALENDAR", "work/"), "201");
-  ASSERT_EQ(dav("MKCOL", "people/",
-                R"(<?xml version="1.0"?><mkcol xmlns="DAV:" xmlns:C="urn:ietf:params:xml:ns:carddav">)"
-                R"(<set><prop><resourcetype><collection/><C:addressbook/></resourcetype></prop></set></mkcol>)",
-                "application/xml"),
-            "201");
-  for (const char* uid : {"e1", "e2"}) ASSERT_EQ(dav("PUT", std::string("work/") + uid + ".ics", event(uid, uid)), "201");
+  ASSERT_EQ(
+      dav("MKCOL", "people/",
+          R"(<?xml version="1.0"?><mkcol xmlns="DAV:" xmlns:C="urn:ietf:params:xml:ns:carddav">)"
+          R"(<set><prop><resourcetype><collection/><C:addressbook/></resourcetype></prop></set></mkcol>)",
+          "application/xml"),
+      "201");
+  for (const char* uid : {"e1", "e2"})
+    ASSERT_EQ(dav("PUT", std::string("work/") + uid + ".ics", event(uid, uid)), "201");
   for (const char* uid : {"c1", "c2"})
-    ASSERT_EQ(dav("PUT", std::string("people/") + uid + ".vcf", card(uid, uid), "text/vcard"), "201");
+    ASSERT_EQ(dav("PUT", std::string("people/") + uid + ".vcf", card(uid, uid), "text/vcard"),
+              "201");
 
   // A credentials file that others can read is refused before anything is downloaded.
   fs::permissions(credentials_, fs::perms::group_read | fs::perms::others_read,
@@ -215,7 +221,8 @@ TEST_F(SourceRefresh, PlainServerAnswersUnchangedAndABrokenDownloadKeepsTheStore
     run = tessel({"refresh"});
     EXPECT_EQ(run.status, 1);
     EXPECT_CONTAINS(run.err, message);
-    const std::string events = tessel({"records", "list", "--entity", "tessel.calendars.Event"}).out;
+    const std::string events =
+        tessel({"records", "list", "--entity", "tessel.calendars.Event"}).out;
     EXPECT_CONTAINS(events, "Dentist");
     EXPECT_EQ(splitLines(events).size(), 1u);
   }
