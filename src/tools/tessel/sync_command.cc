@@ -3,13 +3,11 @@
 #include <chrono>
 #include <csignal>
 #include <cstdint>
-#include <cstdio>
 #include <cstdlib>
 #include <exception>
 #include <filesystem>
 #include <iostream>
 #include <map>
-#include <random>
 #include <string_view>
 #include <vector>
 
@@ -22,6 +20,7 @@
 #include "tools/tessel/device_commands.h"
 #include "tools/tessel/notification_file.h"
 #include "tools/tessel/player_contents.h"
+#include "tools/tessel/progress_file.h"
 #include "tools/tessel/progress_view.h"
 #include "tools/tessel/sync_outcome.h"
 
@@ -138,57 +137,6 @@ std::vector<Target> chooseTargets(CommandContext& context, const std::optional<s
   return targets;
 }
 
-// The notifications log the tool writes and this command follows: $TESSEL_NOTIFICATIONS_LOG,
-// which others may follow too, or else a file of this run's own, removed at its end.
-class ProgressFile {
- public:
-  static Result<ProgressFile> open() {
-    const char* shared = std::getenv("TESSEL_NOTIFICATIONS_LOG");
-    if (shared != nullptr && *shared != '\0') return ProgressFile(shared, Ownership::Shared);
-    const char* runtime = std::getenv("XDG_RUNTIME_DIR");
-    std::error_code error;
-    const fs::path folder = runtime != nullptr && fs::is_directory(runtime, error)
-                                ? fs::path(runtime)
-                                : fs::temp_directory_path(error);
-    std::random_device random;
-    for (int attempt = 0; attempt < 8; ++attempt) {
-      const fs::path path = folder / ("tessel-sync-" + std::to_string(random()) + ".jsonl");
-      // "x": created here or not at all, so no other file is ever taken over.
-      if (std::FILE* file = std::fopen(path.c_str(), "wx")) {
-        std::fclose(file);
-        return ProgressFile(path, Ownership::Own);
-      }
-    }
-    return zt::platform::Error{"cannot make a file for the progress of the sync in " +
-                               folder.string()};
-  }
-
-  ProgressFile(ProgressFile&& other) noexcept : path_(std::move(other.path_)), own_(other.own_) {
-    other.own_ = Ownership::Shared;
-  }
-  ProgressFile(const ProgressFile&) = delete;
-  ProgressFile& operator=(const ProgressFile&) = delete;
-  ProgressFile& operator=(ProgressFile&&) = delete;
-  ~ProgressFile() {
-    std::error_code ignored;
-    if (own_ == Ownership::Own) fs::remove(path_, ignored);
-  }
-
-  const fs::path& path() const { return path_; }
-  // What the tool's environment needs so that it writes here.
-  std::map<std::string, std::string> environment() const {
-    if (own_ == Ownership::Shared) return {};
-    return {{"TESSEL_NOTIFICATIONS_LOG", path_.string()}};
-  }
-
- private:
-  enum class Ownership { Shared, Own };
-  ProgressFile(fs::path path, Ownership own) : path_(std::move(path)), own_(own) {}
-
-  fs::path path_;
-  Ownership own_;
-};
-
 std::string logHint() {
   const char* log = std::getenv("ZETOSYNCTOOL_LOG");
   if (log != nullptr && *log != '\0' && std::string_view(log) != "stderr") {
@@ -207,7 +155,8 @@ std::string failureDetail(const Target& target, int status,
     case kSyncPlayerUnavailable: {
       const PlayerState state = playerOf(target.client);
       if (!state.connected) return "the player is not connected: plug it in (tessel devices)";
-      if (!state.volume) return "the player's volume was not mounted in time: mount it, then " + again;
+      if (!state.volume)
+        return "the player's volume was not mounted in time: mount it, then " + again;
       return "another sync is using the player: " + again + " once it ends";
     }
     default:
@@ -279,8 +228,8 @@ PlayerSync syncOne(CommandContext& context, const Target& target, const fs::path
   std::map<std::string, std::string> environment = progress.environment();
   // The tool takes no --store: it is told through its environment which store this is.
   environment["TESSEL_STORE"] = context.storePath().string();
-  Result<zt::platform::ChildProcess> tool =
-      zt::platform::ChildProcess::start(synctool, {"--oneshot", "--sync", target.client}, environment);
+  Result<zt::platform::ChildProcess> tool = zt::platform::ChildProcess::start(
+      synctool, {"--oneshot", "--sync", target.client}, environment);
   if (!tool) {
     outcome.detail = tool.error();
     return outcome;
@@ -307,10 +256,10 @@ PlayerSync syncOne(CommandContext& context, const Target& target, const fs::path
   outcome.status = status && *status >= kSyncSucceeded && *status <= kSyncPlayerUnavailable
                        ? *status
                        : kSyncFailed;
-  outcome.detail = outcome.status == kSyncSucceeded
-                       ? contentsDetail(target)
-                       : failureDetail(target, outcome.status,
-                                       status ? std::nullopt : std::optional(*ended));
+  outcome.detail =
+      outcome.status == kSyncSucceeded
+          ? contentsDetail(target)
+          : failureDetail(target, outcome.status, status ? std::nullopt : std::optional(*ended));
   return outcome;
 }
 
