@@ -1,3 +1,4 @@
+#include <algorithm>
 #include <cmath>
 #include <cstdint>
 #include <limits>
@@ -7,6 +8,7 @@
 
 #include "tessel/record_json.h"
 #include "tessel/record_json_path.h"
+#include "tessel/record_json_scanner.h"
 #include "tessel/record_json_values.h"
 #include "tessel/schema.h"
 
@@ -250,7 +252,12 @@ Dictionary recordFromJson(std::string_view json) {
 
 std::vector<Record> parseRecordLines(std::string_view text) {
   std::vector<Record> out;
-  std::unordered_map<std::string, std::size_t> lineOfId;
+  // Room for every line up front: the identifier index below views the records' own strings,
+  // so they must never move.
+  out.reserve(static_cast<std::size_t>(std::count(text.begin(), text.end(), '\n')) + 1);
+  std::unordered_map<std::string_view, std::size_t> lineOfId;
+  lineOfId.reserve(out.capacity());
+  typed_json::RecordLineScanner scanner;
   std::size_t lineNumber = 0;
   while (!text.empty()) {
     ++lineNumber;
@@ -260,14 +267,16 @@ std::vector<Record> parseRecordLines(std::string_view text) {
     if (!line.empty() && line.back() == '\r') line.remove_suffix(1);
     if (line.find_first_not_of(" \t") == std::string_view::npos) continue;
 
-    Record record = onLine(lineNumber, [&] { return recordLineFromJson(parseJson(line)); });
-    auto [it, inserted] = lineOfId.emplace(record.id, lineNumber);
+    std::optional<Record> scanned = scanner.scan(line);
+    out.push_back(scanned ? std::move(*scanned) : onLine(lineNumber, [&] {
+      return recordLineFromJson(parseJson(line));
+    }));
+    auto [it, inserted] = lineOfId.emplace(out.back().id, lineNumber);
     if (!inserted) {
       throw RecordJsonError(lineNumber, "id",
-                            "identifier " + jsonQuoted(record.id) + " was already given on line " +
-                                std::to_string(it->second));
+                            "identifier " + jsonQuoted(out.back().id) +
+                                " was already given on line " + std::to_string(it->second));
     }
-    out.push_back(std::move(record));
   }
   return out;
 }
