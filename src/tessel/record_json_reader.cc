@@ -1,6 +1,6 @@
-#include <algorithm>
 #include <cmath>
 #include <cstdint>
+#include <cstring>
 #include <limits>
 #include <unordered_map>
 #include <unordered_set>
@@ -254,7 +254,13 @@ std::vector<Record> parseRecordLines(std::string_view text) {
   std::vector<Record> out;
   // Room for every line up front: the identifier index below views the records' own strings,
   // so they must never move.
-  out.reserve(static_cast<std::size_t>(std::count(text.begin(), text.end(), '\n')) + 1);
+  std::size_t lines = 1;
+  for (const char *at = text.data(), *end = at + text.size();
+       (at = static_cast<const char*>(std::memchr(at, '\n', static_cast<std::size_t>(end - at))));
+       ++at) {
+    ++lines;
+  }
+  out.reserve(lines);
   std::unordered_map<std::string_view, std::size_t> lineOfId;
   lineOfId.reserve(out.capacity());
   typed_json::RecordLineScanner scanner;
