@@ -1,8 +1,9 @@
+#include <algorithm>
 #include <cmath>
 #include <cstdint>
 #include <cstring>
+#include <functional>
 #include <limits>
-#include <unordered_map>
 #include <unordered_set>
 #include <utility>
 
@@ -252,17 +253,22 @@ Dictionary recordFromJson(std::string_view json) {
 
 std::vector<Record> parseRecordLines(std::string_view text) {
   std::vector<Record> out;
-  // Room for every line up front: the identifier index below views the records' own strings,
-  // so they must never move.
+  // Room for every line, but no more than a text of short lines can hold: a text of nothing
+  // but line ends must not reserve a record per byte.
   std::size_t lines = 1;
   for (const char *at = text.data(), *end = at + text.size();
        (at = static_cast<const char*>(std::memchr(at, '\n', static_cast<std::size_t>(end - at))));
        ++at) {
     ++lines;
   }
-  out.reserve(lines);
-  std::unordered_map<std::string_view, std::size_t> lineOfId;
-  lineOfId.reserve(out.capacity());
+  out.reserve(std::min(lines, text.size() / 32 + 1));
+  // The records read so far by identifier, as indexes into `out`, which may still move.
+  std::vector<std::size_t> lineOf;
+  lineOf.reserve(out.capacity());
+  const auto idHash = [&out](std::size_t i) { return std::hash<std::string_view>{}(out[i].id); };
+  const auto sameId = [&out](std::size_t a, std::size_t b) { return out[a].id == out[b].id; };
+  std::unordered_set<std::size_t, decltype(idHash), decltype(sameId)> seen(out.capacity(), idHash,
+                                                                           sameId);
   typed_json::RecordLineScanner scanner;
   std::size_t lineNumber = 0;
   while (!text.empty()) {
@@ -277,11 +283,12 @@ std::vector<Record> parseRecordLines(std::string_view text) {
     out.push_back(scanned ? std::move(*scanned) : onLine(lineNumber, [&] {
       return recordLineFromJson(parseJson(line));
     }));
-    auto [it, inserted] = lineOfId.emplace(out.back().id, lineNumber);
+    lineOf.push_back(lineNumber);
+    auto [it, inserted] = seen.insert(out.size() - 1);
     if (!inserted) {
       throw RecordJsonError(lineNumber, "id",
                             "identifier " + jsonQuoted(out.back().id) +
-                                " was already given on line " + std::to_string(it->second));
+                                " was already given on line " + std::to_string(lineOf[*it]));
     }
   }
   return out;
