@@ -5,7 +5,9 @@
 #include <fstream>
 #include <map>
 #include <set>
+#include <string_view>
 #include <system_error>
+#include <unordered_set>
 
 #include "importers/import_file.h"
 #include "importers/stable_hash.h"
@@ -122,7 +124,9 @@ StoredCalendars storedCalendars(const Store& store, const std::vector<ICalCalend
 // The calendar's records are moved into `records`.
 void mergeCalendar(ICalCalendar& calendar, const RecordMap& before, SyncDeletes syncDeletes,
                    std::vector<Record>& records, std::vector<std::string>& stale) {
-  std::set<std::string> produced;
+  // Views of the records' identifiers, used before the records are moved out below.
+  std::unordered_set<std::string_view> produced;
+  produced.reserve(calendar.records.size());
   for (const Record& record : calendar.records) produced.insert(record.id);
 
   std::vector<Record>& written = calendar.records;

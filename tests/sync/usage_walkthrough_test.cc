@@ -110,9 +110,10 @@ TEST_F(UsageWalkthrough, EveryCommandOfThePageRunsAndThePlayerEndsUpSynced) {
   EXPECT_CONTAINS(run.out,
                   "  contacts: the members of Family (vcard-group/Family), Friends "
                   "(vcard-group/Friends)\n");
-  // tessel watch followed the notifications file to the end of the sync.
-  EXPECT_CONTAINS(run.err, "tessel: no session bus; following ");
+  // tessel sync found the tool beside it, followed its progress to the end and said what the
+  // player holds.
   EXPECT_CONTAINS(run.out, "zeto-A27001A2B3C4D [##############################] 100.0% done");
+  EXPECT_CONTAINS(run.out, "zeto-A27001A2B3C4D: synced: 30 contacts, 2 calendars\n");
   EXPECT_CONTAINS(run.out, "AlwaysPushVCard = true\t# ");
   EXPECT_EQ(zt::test_support::readFile(home_ / ".config" / "zetosynctool" / "defaults.conf"),
             "AlwaysPushVCard = true\n");
@@ -125,6 +126,21 @@ TEST_F(UsageWalkthrough, EveryCommandOfThePageRunsAndThePlayerEndsUpSynced) {
         home_ / ".local/share/man/man1/zetosynctool.1",
         home_ / ".config/systemd/user/zetosync@.service"})
     EXPECT_TRUE(fs::exists(made)) << made;
+
+  // What the installed unit runs when udev names the player's serial number.
+  std::string start;
+  for (const std::string& line : zt::test_support::splitLines(
+           zt::test_support::readFile(home_ / ".config/systemd/user/zetosync@.service")))
+    if (line.rfind("ExecStart=", 0) == 0) start = line.substr(10);
+  for (const auto& [specifier, value] : {std::pair<std::string, std::string>{"%h", home_.string()},
+                                         {"%i", "000A27001A2B3C4D"},
+                                         {"%%", "%"}})
+    for (auto at = start.find(specifier); at != std::string::npos;
+         at = start.find(specifier, at + value.size()))
+      start.replace(at, specifier.size(), value);
+  const auto unit = bash(start);
+  EXPECT_EQ(unit.status, 0) << start << '\n' << unit.out << unit.err;
+  EXPECT_CONTAINS(unit.out, "zeto-A27001A2B3C4D: synced: ");
 }
 
 TEST_F(UsageWalkthrough, TheMessagesMetOnTheWay) {

@@ -18,7 +18,7 @@ std::filesystem::path comparable(const std::filesystem::path& path) {
 }  // namespace
 
 void CommandContext::warnIfToolReadsAnotherStore(const std::filesystem::path& path) const {
-  if (!storePath_) return;
+  if (!storePath_ || storePassedToTool_) return;
   const std::filesystem::path toolStore = Store::resolvePath();
   if (comparable(toolStore) == comparable(path)) return;
   // zetosynctool takes no --store: it reads $TESSEL_STORE or the default path only.

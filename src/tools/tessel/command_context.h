@@ -20,6 +20,9 @@ class CommandContext {
   // rather than quietly create an empty store elsewhere.
   Store& store(StoreOpening opening = StoreOpening::MustExist);
   std::filesystem::path storePath() const;
+  // The command runs zetosynctool itself and tells it which store to read: --store then
+  // names the store the tool reads, and warrants no warning.
+  void passStoreToTool() { storePassedToTool_ = true; }
   std::istream& in() const { return in_; }
   std::ostream& out() const { return out_; }
 
@@ -31,6 +34,7 @@ class CommandContext {
   std::istream& in_;
   std::ostream& out_;
   std::unique_ptr<Store> store_;
+  bool storePassedToTool_ = false;
 };
 
 }  // namespace tessel::cli

@@ -13,6 +13,7 @@
 #include "tools/tessel/import_ical_command.h"
 #include "tools/tessel/import_vcard_command.h"
 #include "tools/tessel/record_commands.h"
+#include "tools/tessel/sync_command.h"
 #include "tools/tessel/usage_error.h"
 
 namespace tessel::cli {
@@ -330,6 +331,27 @@ void addDeviceCommands(CLI::App& app, CommandLine& line) {
   watch->callback([&line, watchedClient] {
     line.command = [&line, watchedClient](CommandContext& context) {
       line.status = watchSyncs(context, *watchedClient);
+    };
+  });
+
+  auto syncedClient = std::make_shared<std::optional<std::string>>();
+  auto* sync = app.add_subcommand(
+      "sync",
+      "Refresh every source, then sync with zetosynctool (beside tessel, else on PATH) the "
+      "client's player, or every connected player whose client is registered, one after "
+      "another: the progress, one line of outcome per player, and at the end a desktop "
+      "notification when a session bus is there. Exit status:\n"
+      "  0  synced\n"
+      "  1  cancelled\n"
+      "  2  failed (also: no such client, no zetosynctool, no store)\n"
+      "  3  player unavailable (not connected, not mounted, or in another sync)\n"
+      "     of several players, the highest of theirs\n"
+      "  4  synced, but a source could not be refreshed\n"
+      "  5  no registered player is connected");
+  sync->add_option("ID", *syncedClient, "Client identifier (default: every connected player's)");
+  sync->callback([&line, syncedClient] {
+    line.command = [&line, syncedClient](CommandContext& context) {
+      line.status = syncPlayers(context, *syncedClient);
     };
   });
 }

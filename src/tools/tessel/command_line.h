@@ -26,7 +26,7 @@ void addCalendarCommands(CLI::App& app, CommandLine& line);  // calendars order
 void addClientCommands(CLI::App& app, CommandLine& line);    // client ..., client filter ...
 void addSessionCommands(CLI::App& app, CommandLine& line);   // session cancel
 void addDefaultsCommands(CLI::App& app, CommandLine& line);  // defaults [set|unset]
-void addDeviceCommands(CLI::App& app, CommandLine& line);    // devices, watch
+void addDeviceCommands(CLI::App& app, CommandLine& line);    // devices, watch, sync
 void addSourceCommands(CLI::App& app, CommandLine& line);    // source ..., refresh
 
 }  // namespace tessel::cli

@@ -12,10 +12,8 @@ RefreshOutcome refreshSources(CommandContext& context) {
   auto list = sources::SourceList::load(sources::SourceList::defaultPath());
   if (!list) throw std::runtime_error(list.error());
   RefreshOutcome outcome;
-  if (list->sources().empty()) {
-    context.out() << "no sources to refresh (tessel source add LOCATION adds one)\n";
-    return outcome;
-  }
+  outcome.sources = list->sources().size();
+  if (outcome.sources == 0) return outcome;
   Store& store = context.store();
   const sources::SourceStates states(context.storePath());
   const auto http = sources::makeHttpClient();

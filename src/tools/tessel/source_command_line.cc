@@ -66,7 +66,10 @@ void addSourceCommands(CLI::App& app, CommandLine& line) {
       "cannot be read keeps what it brought before, and the exit status is 1");
   refresh->callback([&line] {
     line.command = [&line](CommandContext& context) {
-      if (!refreshSources(context).ok()) line.status = 1;
+      const RefreshOutcome outcome = refreshSources(context);
+      if (outcome.sources == 0)
+        context.out() << "no sources to refresh (tessel source add LOCATION adds one)\n";
+      if (!outcome.ok()) line.status = 1;
     };
   });
 }
