@@ -4,66 +4,29 @@
 // temporary storage and a free port. Skipped where radicale or python3 is not installed
 // (scripts/setup --tests installs them).
 
-#include <arpa/inet.h>
-#include <netinet/in.h>
-#include <sys/socket.h>
-#include <unistd.h>
-
 #include <chrono>
 #include <thread>
 
+#include "support/radicale_server.h"
 #include "support/scoped_environment.h"
 #include "tools/tessel/tessel_command_fixture.h"
 
 namespace {
 
 using namespace tessel::testing;
+using zt::test_support::cardText;
 using zt::test_support::contains;
+using zt::test_support::eventText;
 using zt::test_support::splitLines;
 
-constexpr const char* kRadicale = "/usr/bin/radicale";
 constexpr const char* kPython = "/usr/bin/python3";
-
-int freePort() {
-  const int fd = ::socket(AF_INET, SOCK_STREAM, 0);
-  sockaddr_in address{};
-  address.sin_family = AF_INET;
-  address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
-  socklen_t length = sizeof address;
-  ::bind(fd, reinterpret_cast<sockaddr*>(&address), sizeof address);
-  ::getsockname(fd, reinterpret_cast<sockaddr*>(&address), &length);
-  ::close(fd);
-  return ntohs(address.sin_port);
-}
-
-bool accepts(int port) {
-  const int fd = ::socket(AF_INET, SOCK_STREAM, 0);
-  sockaddr_in address{};
-  address.sin_family = AF_INET;
-  address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
-  address.sin_port = htons(static_cast<std::uint16_t>(port));
-  const bool connected = ::connect(fd, reinterpret_cast<sockaddr*>(&address), sizeof address) == 0;
-  ::close(fd);
-  return connected;
-}
-
-std::string event(const std::string& uid, const std::string& summary) {
-  return "BEGIN:VCALENDAR\r\nVERSION:2.0\r\nPRODID:-//test//EN\r\nBEGIN:VEVENT\r\nUID:" + uid +
-         "\r\nDTSTAMP:20260101T000000Z\r\nDTSTART:20260102T100000Z\r\nSUMMARY:" + summary +
-         "\r\nEND:VEVENT\r\nEND:VCALENDAR\r\n";
-}
-
-std::string card(const std::string& uid, const std::string& name) {
-  return "BEGIN:VCARD\r\nVERSION:3.0\r\nUID:" + uid + "\r\nFN:" + name + "\r\nN:" + name +
-         ";;;;\r\nEND:VCARD\r\n";
-}
 
 class SourceRefresh : public TesselCommandTest {
  protected:
   void SetUp() override {
     TesselCommandTest::SetUp();
-    for (const char* program : {kRadicale, kPython})
-      if (!fs::exists(program)) GTEST_SKIP() << program << " is not installed";
+    if (!zt::test_support::RadicaleServer::installed())
+      GTEST_SKIP() << "radicale (or python3) is not installed";
     environment_.set("XDG_CONFIG_HOME", (dir_ / "config").string());
     ASSERT_EQ(tessel({"init"}).status, 0);
     writeCredentials("alice:secret");
@@ -74,34 +37,6 @@ class SourceRefresh : public TesselCommandTest {
     fs::permissions(credentials_, fs::perms::owner_read | fs::perms::owner_write);
   }
 
-  // Waits for a server to take connections on `port`.
-  static ::testing::AssertionResult listening(int port) {
-    for (int tries = 0; tries < 200; ++tries) {
-      if (accepts(port)) return ::testing::AssertionSuccess();
-      std::this_thread::sleep_for(std::chrono::milliseconds(50));
-    }
-    return ::testing::AssertionFailure() << "nothing listens on port " << port;
-  }
-
-  // One request to Radicale as alice, through python3's own HTTP client: its status.
-  std::string dav(const std::string& method, const std::string& path, const std::string& body = "",
-                  const std::string& type = "text/calendar") {
-    const std::string script =
-        "import base64, sys, urllib.error, urllib.request\n"
-        "method, url, kind, secret = sys.argv[1:5]\n"
-        "data = sys.stdin.buffer.read() or None\n"
-        "request = urllib.request.Request(url, data=data, method=method)\n"
-        "user = open(secret, 'rb').read().strip()\n"
-        "request.add_header('Authorization', 'Basic ' + base64.b64encode(user).decode())\n"
-        "request.add_header('Content-Type', kind)\n"
-        "try:\n  print(urllib.request.urlopen(request).status)\n"
-        "except urllib.error.HTTPError as e:\n  print(e.code)\n";
-    // The password comes from the credentials file, never from a command line.
-    const Outcome run =
-        runRaw({kPython, "-c", script, method, base_ + path, type, credentials_.string()}, body);
-    return run.out.substr(0, 3);
-  }
-
   std::size_t count(std::string_view entity) {
     const Outcome run = tessel({"records", "list", "--entity", std::string(entity)});
     EXPECT_EQ(run.status, 0) << run.err;
@@ -110,50 +45,41 @@ class SourceRefresh : public TesselCommandTest {
 
   zt::test_support::ScopedEnvironment environment_;
   fs::path credentials_ = dir_ / "credentials";
-  std::string base_;
 };
 
 TEST_F(SourceRefresh, RadicaleCollectionsComeInLeaveTheStoreAndSurviveAWrongPassword) {
-  const int port = freePort();
   writeFile(dir_ / "users", "alice:secret\n");
-  zt::test_support::BackgroundProcess radicale(
-      {kRadicale, "--config", "", "--server-hosts", "127.0.0.1:" + std::to_string(port),
-       "--storage-filesystem-folder", (dir_ / "collections").string(), "--auth-type", "htpasswd",
-       "--auth-htpasswd-filename", (dir_ / "users").string(), "--auth-htpasswd-encryption", "plain",
-       "--logging-level", "critical"});
-  ASSERT_TRUE(listening(port));
-  base_ = "http://127.0.0.1:" + std::to_string(port) + "/alice/";
-  ASSERT_EQ(dav("MKCALENDAR", "work/"), "201");
-  ASSERT_EQ(
-      dav("MKCOL", "people/",
-          R"(<?xml version="1.0"?><mkcol xmlns="DAV:" xmlns:C="urn:ietf:params:xml:ns:carddav">)"
-          R"(<set><prop><resourcetype><collection/><C:addressbook/></resourcetype></prop></set></mkcol>)",
-          "application/xml"),
-      "201");
+  const zt::test_support::RadicaleServer radicale(dir_.path(), dir_ / "users");
+  ASSERT_TRUE(radicale.listening());
+  const std::string base = radicale.home();
+  ASSERT_EQ(radicale.makeCalendar("work"), "201");
+  ASSERT_EQ(radicale.makeAddressBook("people"), "201");
   for (const char* uid : {"e1", "e2"})
-    ASSERT_EQ(dav("PUT", std::string("work/") + uid + ".ics", event(uid, uid)), "201");
+    ASSERT_EQ(radicale.request("PUT", std::string("work/") + uid + ".ics", eventText(uid, uid)),
+              "201");
   for (const char* uid : {"c1", "c2"})
-    ASSERT_EQ(dav("PUT", std::string("people/") + uid + ".vcf", card(uid, uid), "text/vcard"),
+    ASSERT_EQ(radicale.request("PUT", std::string("people/") + uid + ".vcf", cardText(uid, uid),
+                               "text/vcard"),
               "201");
 
   // A credentials file that others can read is refused before anything is downloaded.
   fs::permissions(credentials_, fs::perms::group_read | fs::perms::others_read,
                   fs::perm_options::add);
-  Outcome run = tessel({"source", "add", base_ + "work/", "--credentials", credentials_.string()});
+  Outcome run = tessel({"source", "add", base + "work/", "--credentials", credentials_.string()});
   EXPECT_EQ(run.status, 1);
   EXPECT_CONTAINS(run.err, "chmod 600");
   writeCredentials("alice:secret");
   // What each collection holds is read from it.
   for (const char* collection : {"work/", "people/"}) {
-    run = tessel({"source", "add", base_ + collection, "--credentials", credentials_.string()});
+    run = tessel({"source", "add", base + collection, "--credentials", credentials_.string()});
     ASSERT_EQ(run.status, 0) << run.err;
   }
   run = tessel({"source", "list"});
-  EXPECT_CONTAINS(run.out, "1\tcalendar\t" + base_ + "work/");
-  EXPECT_CONTAINS(run.out, "2\taddress book\t" + base_ + "people/");
+  EXPECT_CONTAINS(run.out, "1\tcalendar\t" + base + "work/");
+  EXPECT_CONTAINS(run.out, "2\taddress book\t" + base + "people/");
 
   // A card imported by hand is not the source's, and stays whatever the source loses.
-  writeFile(dir_ / "hand.vcf", card("h1", "Hand"));
+  writeFile(dir_ / "hand.vcf", cardText("h1", "Hand"));
   ASSERT_EQ(tessel({"import", "vcard", (dir_ / "hand.vcf").string()}).status, 0);
   run = tessel({"refresh"});
   ASSERT_EQ(run.status, 0) << run.err;
@@ -163,8 +89,8 @@ TEST_F(SourceRefresh, RadicaleCollectionsComeInLeaveTheStoreAndSurviveAWrongPass
   EXPECT_EQ(count("tessel.contacts.Contact"), 3u);
 
   // What left the server leaves the store.
-  ASSERT_EQ(dav("DELETE", "work/e2.ics"), "200");
-  ASSERT_EQ(dav("DELETE", "people/c2.vcf"), "200");
+  ASSERT_EQ(radicale.request("DELETE", "work/e2.ics"), "200");
+  ASSERT_EQ(radicale.request("DELETE", "people/c2.vcf"), "200");
   run = tessel({"refresh"});
   ASSERT_EQ(run.status, 0) << run.err;
   EXPECT_EQ(count("tessel.calendars.Event"), 1u);
@@ -184,7 +110,7 @@ TEST_F(SourceRefresh, RadicaleCollectionsComeInLeaveTheStoreAndSurviveAWrongPass
 TEST_F(SourceRefresh, PlainServerAnswersUnchangedAndABrokenDownloadKeepsTheStore) {
   const fs::path root = dir_ / "www";
   fs::create_directories(root);
-  writeFile(root / "home.ics", event("h1", "Dentist"));
+  writeFile(root / "home.ics", eventText("h1", "Dentist"));
   const fs::path portFile = dir_ / "port";
   const fs::path requests = dir_ / "requests";
   zt::test_support::BackgroundProcess server(
@@ -210,8 +136,8 @@ TEST_F(SourceRefresh, PlainServerAnswersUnchangedAndABrokenDownloadKeepsTheStore
 
   // A changed collection that cannot be read keeps what the store had.
   const std::tuple<std::string, std::string, std::string> broken[] = {
-      {"cut", event("h2", "Gone"), "the download stopped before its end"},
-      {"login", event("h2", "Gone"), "the server sent a web page, not a calendar"},
+      {"cut", eventText("h2", "Gone"), "the download stopped before its end"},
+      {"login", eventText("h2", "Gone"), "the server sent a web page, not a calendar"},
       {"", "BEGIN:VCALENDAR\r\nBEGIN:VEVENT\r\n", "home.ics: line 2: "},
   };
   for (const auto& [mode, text, message] : broken) {
