@@ -9,6 +9,7 @@
 #include <vector>
 
 #include "importers/ical_content_lines.h"
+#include "importers/ical_vcalendar.h"
 #include "importers/import_kind.h"
 #include "importers/physical_lines.h"
 #include "importers/vcard_decoding.h"
@@ -92,6 +93,15 @@ std::string taggedLine(const ICalContentLine& line) {
   tagged += std::to_string(line.line);
   tagged.append(line.text, line.name.size());
   return tagged;
+}
+
+// Whether a VERSION line says vCalendar 1.0 (true) or another version (false); none for
+// other lines.
+std::optional<bool> isVCalendarVersion(const ICalContentLine& line) {
+  if (zt::platform::upperAscii(line.name) != "VERSION") return std::nullopt;
+  const std::size_t colon = line.text.find(':');
+  if (colon == std::string::npos) return std::nullopt;
+  return zt::platform::trimBlanks(std::string_view(line.text).substr(colon + 1)) == "1.0";
 }
 
 bool isLineTag(const std::string& name) {
@@ -182,13 +192,21 @@ void reportUnreadLines(std::string_view text, const std::string& source, icalcom
   ImportWarnings again(OnFault::Skip);
   std::vector<std::size_t> begins;
   std::vector<icalcomponent*> startless;
+  bool vCalendar = false;
   forEachICalContentLine(
       text, source,
       [&](const ICalContentLine& line) {
         if (line.kind == ICalContentLine::Kind::Begin) return begins.push_back(line.line);
         if (line.kind == ICalContentLine::Kind::End) return begins.pop_back();
         if (isLineTag(line.name)) return;
-        std::optional<std::string> complaint = complaintAbout(line.text);
+        if (std::optional<bool> version = isVCalendarVersion(line)) vCalendar = *version;
+        std::optional<std::string> complaint;
+        for (const std::string& asICal :
+             vCalendar ? vCalendarAsICalendar(line) : std::vector<std::string>{line.text}) {
+          if (!asICal.starts_with("BEGIN:") && !asICal.starts_with("END:") && !complaint) {
+            complaint = complaintAbout(asICal);
+          }
+        }
         if (!complaint) return;
         icalcomponent* component = nullptr;
         if (!begins.empty()) {
@@ -267,6 +285,8 @@ ICalDocument ICalDocument::parse(std::string_view input, std::string source,
   // The lines go to libical as they are read, each checked one, so that neither the
   // unfolded text nor its lines are held beside libical's components.
   std::string tagged;
+  // VERSION:1.0 says the calendar is a vCalendar; it comes before the components.
+  bool vCalendar = false;
   forEachICalContentLine(
       text, source,
       [&](const ICalContentLine& line) {
@@ -280,8 +300,24 @@ ICalDocument ICalDocument::parse(std::string_view input, std::string source,
             break;
           case ICalContentLine::Kind::Property:
             if (isLineTag(line.name)) break;
-            tagged = taggedLine(line);
-            parser.add(tagged);
+            if (std::optional<bool> version = isVCalendarVersion(line)) vCalendar = *version;
+            if (!vCalendar) {
+              tagged = taggedLine(line);
+              parser.add(tagged);
+              break;
+            }
+            for (std::string& asICal : vCalendarAsICalendar(line)) {
+              const std::string name = asICal.substr(0, asICal.find_first_of(";:"));
+              if (name == "BEGIN" || name == "END") {
+                parser.add(asICal);
+                if (name == "BEGIN") {
+                  parser.add(std::string(kLineName) + ':' + std::to_string(line.line));
+                }
+                continue;
+              }
+              tagged = taggedLine({ICalContentLine::Kind::Property, line.line, name, asICal});
+              parser.add(tagged);
+            }
             break;
         }
       },

@@ -8,7 +8,8 @@ std::string warningText(const ImportWarning& warning) {
 
 void ImportWarnings::fault(const ImportError& fault, std::string_view consequence) {
   if (onFault_ == OnFault::Refuse) throw fault;
-  warnings_.push_back({fault.source(), fault.line(), fault.reason() + "; " + std::string(consequence)});
+  warnings_.push_back(
+      {fault.source(), fault.line(), fault.reason() + "; " + std::string(consequence)});
 }
 
 }  // namespace tessel::importers

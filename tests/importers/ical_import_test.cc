@@ -55,9 +55,11 @@ std::string calendarText(const std::string& body) {
 // only by their VTIMEZONE (a southern-hemisphere daylight rule, one that ended), vendor
 // prefixes before IANA names, floating times, and tasks with "/" and "#" in their UID; and
 // habits.ics: LF or CR line ends, a byte order mark, a fold inside a UTF-8 character, blank
-// lines, empty values and libical's own X-LIC-ERROR remarks.
+// lines, empty values and libical's own X-LIC-ERROR remarks; phone_1_0.vcs: vCalendar 1.0's
+// quoted-printable Latin-1, recurrence grammar, alarms, lists and status words.
 TEST(ICalImportReading, EachExportBecomesTheRecordsOfItsReferenceFile) {
-  for (const char* source : {"outlook.ics", "google.ics", "custom_zone.ics", "habits.ics"}) {
+  for (const char* source :
+       {"outlook.ics", "google.ics", "custom_zone.ics", "habits.ics", "phone_1_0.vcs"}) {
     SCOPED_TRACE(source);
     const ICalCalendar calendar = readDataFile(source);
     std::string lines = "title " + calendar.title + ", " + std::to_string(calendar.eventCount) +
