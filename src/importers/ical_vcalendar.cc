@@ -162,8 +162,9 @@ std::vector<std::string> alarm(const Property& property) {
     std::size_t start = 0;
     while (true) {
       const std::size_t end = property.value.find(';', start);
-      all.emplace_back(trimBlanks(std::string_view(property.value).substr(
-          start, end == std::string::npos ? std::string::npos : end - start)));
+      all.emplace_back(trimBlanks(
+          std::string_view(property.value)
+              .substr(start, end == std::string::npos ? std::string::npos : end - start)));
       if (end == std::string::npos) return all;
       start = end + 1;
     }

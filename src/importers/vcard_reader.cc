@@ -178,6 +178,8 @@ void forEachCard(std::string_view input, const std::string& source,
   Card card;
   // Depth of BEGIN:VCARD; cards nested in a vCard 2.1 AGENT property are skipped.
   int depth = 0;
+  bool sawCard = false;
+  std::optional<std::size_t> firstOutside;
   std::size_t i = 0;
   while (i < lines.size()) {
     const PhysicalLine& first = lines[i++];
@@ -192,6 +194,7 @@ void forEachCard(std::string_view input, const std::string& source,
     try {
       content = LineParser(logical, first.number, source).parse();
     } catch (const ImportError& fault) {
+      if (depth == 0 && !firstOutside) firstOutside = first.number;
       warnings.fault(
           fault, depth > 0 ? "dropped this line of the card of line " + std::to_string(card.line)
                            : std::string("dropped this line"));
@@ -218,6 +221,7 @@ void forEachCard(std::string_view input, const std::string& source,
     const bool isVCardMarker = lowerAscii(trimBlanks(content.value)) == "vcard";
     if (content.name == "BEGIN" && isVCardMarker) {
       if (depth++ == 0) card = Card{first.number, {}, {}};
+      sawCard = true;
       continue;
     }
     if (content.name == "END" && isVCardMarker) {
@@ -233,6 +237,7 @@ void forEachCard(std::string_view input, const std::string& source,
       continue;
     }
     if (depth == 0) {
+      if (!firstOutside) firstOutside = first.number;
       warnings.fault(ImportError(source, first.number,
                                  content.name + " outside of a card (BEGIN:VCARD ... END:VCARD)"),
                      "dropped this line");
@@ -244,6 +249,10 @@ void forEachCard(std::string_view input, const std::string& source,
       continue;
     }
     card.properties.push_back(std::move(content));
+  }
+  // Text without a single card is no address book with a few bad lines.
+  if (!sawCard && firstOutside) {
+    throw ImportError(source, firstOutside, "no BEGIN:VCARD: this is not a vCard file");
   }
   if (depth > 0) {
     warnings.fault(ImportError(source, card.line, "card has no END:VCARD"),

@@ -49,7 +49,8 @@ std::vector<Card> readCards(std::string_view text, const std::string& source);
 // The same cards, handed to `visit` one by one as each ends, so that they are not all held
 // at once. Each fault goes through `warnings` when the reading reaches it (`visit` has then
 // seen the cards before it): a line that cannot be read is left out, and a card that the
-// file ends inside is kept. A text of UTF-16 that is not valid is refused as a whole.
+// file ends inside is kept. A text of UTF-16 that is not valid, or with lines but no card at
+// all, raises ImportError.
 void forEachCard(std::string_view text, const std::string& source,
                  const std::function<void(Card&)>& visit, ImportWarnings& warnings);
 
