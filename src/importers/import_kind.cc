@@ -33,7 +33,13 @@ ImportKind importKindOf(std::string_view text) {
   if (first == std::string::npos) {
     return text.size() <= start.size() ? ImportKind::Empty : ImportKind::Unknown;
   }
-  const std::string_view head = std::string_view(start).substr(first);
+  std::string_view head = std::string_view(start).substr(first);
+  // vCard 3.0 lets any line carry a group name: "item1.BEGIN:VCARD" (RFC 2425 section 5.8.2).
+  const std::size_t dot = head.find_first_not_of("abcdefghijklmnopqrstuvwxyz0123456789-");
+  if (dot != std::string_view::npos && dot > 0 && head[dot] == '.' &&
+      head.substr(dot + 1).starts_with("begin:vcard")) {
+    return ImportKind::VCard;
+  }
   if (head.starts_with("begin:vcard")) return ImportKind::VCard;
   for (const char* component : {"begin:vcalendar", "begin:vevent", "begin:vtodo"}) {
     if (head.starts_with(component)) return ImportKind::ICalendar;
