@@ -223,6 +223,13 @@ void reportUnreadLines(std::string_view text, const std::string& source, icalcom
           startless.push_back(component);
           return;
         }
+        // An alarm is when it rings: without its trigger the reader has nothing of it.
+        if (component != nullptr && name == "TRIGGER" &&
+            icalcomponent_isa(component) == ICAL_VALARM_COMPONENT) {
+          warnings.fault(ImportError(source, line.line, name + ": " + *complaint),
+                         "dropped " + ICalDocument::describe(component));
+          return;
+        }
         warnings.fault(ImportError(source, line.line, name + ": " + *complaint),
                        "dropped the " + name +
                            (component != nullptr ? " of " + ICalDocument::describe(component)
