@@ -6,6 +6,7 @@
 #include <cstdlib>
 #include <map>
 #include <memory>
+#include <set>
 #include <vector>
 
 #include "importers/ical_content_lines.h"
@@ -191,7 +192,7 @@ void reportUnreadLines(std::string_view text, const std::string& source, icalcom
   // looks for the lines libical refuses.
   ImportWarnings again(OnFault::Skip);
   std::vector<std::size_t> begins;
-  std::vector<icalcomponent*> startless;
+  std::set<icalcomponent*> startless;
   bool vCalendar = false;
   forEachICalContentLine(
       text, source,
@@ -220,7 +221,7 @@ void reportUnreadLines(std::string_view text, const std::string& source, icalcom
             icalcomponent_isa(component) == ICAL_VEVENT_COMPONENT) {
           warnings.fault(ImportError(source, line.line, name + ": " + *complaint),
                          "dropped " + ICalDocument::describe(component));
-          startless.push_back(component);
+          startless.insert(component);
           return;
         }
         // An alarm is when it rings: without its trigger the reader has nothing of it.
@@ -246,7 +247,14 @@ void reportUnreadLines(std::string_view text, const std::string& source, icalcom
     icalcomponent_remove_property(component, error);
     icalproperty_free(error);
   }
+  // An event is dropped once, and with the one it may stand in.
   for (icalcomponent* event : startless) {
+    bool inDropped = false;
+    for (icalcomponent* parent = icalcomponent_get_parent(event); parent != nullptr;
+         parent = icalcomponent_get_parent(parent)) {
+      inDropped = inDropped || startless.count(parent) != 0;
+    }
+    if (inDropped) continue;
     icalcomponent_remove_component(icalcomponent_get_parent(event), event);
     icalcomponent_free(event);
   }
