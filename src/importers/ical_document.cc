@@ -247,14 +247,18 @@ void reportUnreadLines(std::string_view text, const std::string& source, icalcom
     icalcomponent_remove_property(component, error);
     icalproperty_free(error);
   }
-  // An event is dropped once, and with the one it may stand in.
+  // An event is dropped once: one that stands in another dropped one goes with it. Which
+  // ones those are is known before any is freed.
+  std::vector<icalcomponent*> outermost;
   for (icalcomponent* event : startless) {
     bool inDropped = false;
     for (icalcomponent* parent = icalcomponent_get_parent(event); parent != nullptr;
          parent = icalcomponent_get_parent(parent)) {
       inDropped = inDropped || startless.count(parent) != 0;
     }
-    if (inDropped) continue;
+    if (!inDropped) outermost.push_back(event);
+  }
+  for (icalcomponent* event : outermost) {
     icalcomponent_remove_component(icalcomponent_get_parent(event), event);
     icalcomponent_free(event);
   }
