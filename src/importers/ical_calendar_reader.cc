@@ -5,6 +5,7 @@
 #include <cstdint>
 #include <map>
 #include <memory>
+#include <set>
 #include <utility>
 
 #include "importers/ical_alarm.h"
@@ -93,13 +94,14 @@ struct Related {
 
 class CalendarBuilder {
  public:
-  explicit CalendarBuilder(ICalCalendarSource& source) : source_(source) {}
+  CalendarBuilder(ICalCalendarSource& source, ImportWarnings& warnings)
+      : source_(source), warnings_(warnings) {}
 
   ICalCalendar build() {
     std::vector<ICalDocument> documents;
     documents.reserve(source_.files.size());
     for (ICalFile& file : source_.files) {
-      documents.push_back(ICalDocument::parse(file.text, file.name));
+      documents.push_back(ICalDocument::parse(file.text, file.name, warnings_));
       std::string().swap(file.text);  // libical holds what is needed of it
     }
 
@@ -120,14 +122,21 @@ class CalendarBuilder {
                               {TesselAttribute_Calendars_Calendar_Title, Value(calendar.title)}};
     calendar.records.push_back({calendar.identifier, {}});
     std::vector<std::string> events, tasks;
+    std::set<std::string> dropped;
     for (Item& item : items_) {
-      (item.kind == ItemKind::Event ? events : tasks).push_back(item.identifier);
-      append(item, calendar.records);
+      try {
+        append(item, calendar.records);
+        (item.kind == ItemKind::Event ? events : tasks).push_back(item.identifier);
+      } catch (const ImportError& fault) {
+        warnings_.fault(fault, "dropped " + ICalDocument::describe(item.component));
+        dropped.insert(item.identifier);
+      }
       // What libical read of the component is not needed once it became records.
       icalcomponent_remove_component(icalcomponent_get_parent(item.component), item.component);
       icalcomponent_free(item.component);
       item.component = nullptr;
     }
+    if (!dropped.empty()) forgetDetached(dropped, calendar.records);
     calendar.eventCount = events.size();
     calendar.taskCount = tasks.size();
     calendarRecord.set(TesselRelationship_Calendars_Calendar_Events, Value(relationship(events)));
@@ -161,13 +170,20 @@ class CalendarBuilder {
                 {}};
       ComponentReader reader(document, *zones, component);
       std::string fallback;
+      bool unreadable = false;
       for (icalproperty* property : propertiesOf(component)) {
         switch (icalproperty_isa(property)) {
           case ICAL_UID_PROPERTY:
             if (const char* uid = icalproperty_get_uid(property)) item.uid = uid;
             break;
           case ICAL_RECURRENCEID_PROPERTY:
-            item.recurrenceId = reader.date(property, icalproperty_get_recurrenceid(property));
+            // Which occurrence a component replaces is what it is: without it, it is dropped.
+            try {
+              item.recurrenceId = reader.date(property, icalproperty_get_recurrenceid(property));
+            } catch (const ImportError& fault) {
+              warnings_.fault(fault, "dropped " + ICalDocument::describe(component));
+              unreadable = true;
+            }
             break;
           case ICAL_DTSTART_PROPERTY:
           case ICAL_SUMMARY_PROPERTY:
@@ -177,6 +193,7 @@ class CalendarBuilder {
             break;
         }
       }
+      if (unreadable) continue;
       std::string identifier =
           source_.identifier + (item.kind == ItemKind::Event ? "/event/" : "/task/");
       // RFC 5545 section 3.8.4.7 wants a UID in every component; for the few exporters that
@@ -202,6 +219,24 @@ class CalendarBuilder {
         items_.push_back(std::move(item));
       } else {
         items_[it->second] = std::move(item);
+      }
+    }
+  }
+
+  // A master does not list the overrides that were dropped.
+  static void forgetDetached(const std::set<std::string>& dropped, std::vector<Record>& records) {
+    for (Record& record : records) {
+      const Value* detached = record.record.find(TesselRelationship_Calendars_Event_DetachedEvents);
+      if (detached == nullptr) continue;
+      std::vector<std::string> kept;
+      for (std::string& id : zt::platform::stringsIn(detached)) {
+        if (dropped.count(id) == 0) kept.push_back(std::move(id));
+      }
+      if (kept.empty()) {
+        record.record.erase(TesselRelationship_Calendars_Event_DetachedEvents);
+      } else {
+        record.record.set(TesselRelationship_Calendars_Event_DetachedEvents,
+                          Value(relationship(kept)));
       }
     }
   }
@@ -284,7 +319,13 @@ class CalendarBuilder {
                       Related& related) const {
     std::size_t count = 0;
     for (icalproperty* rule : fields.rules) {
-      if (auto record = recurrenceRecord(reader, rule, fields.start)) {
+      std::optional<Dictionary> record;
+      try {
+        record = recurrenceRecord(reader, rule, fields.start);
+      } catch (const ImportError& fault) {
+        reader.drop(fault, rule);
+      }
+      if (record) {
         std::string id = item.identifier + "#recurrence" + std::to_string(++count);
         related.recurrences.push_back(id);
         related.records.push_back({std::move(id), std::move(*record)});
@@ -292,8 +333,12 @@ class CalendarBuilder {
     }
     count = 0;
     for (icalcomponent* alarm : componentsOf(item.component, ICAL_VALARM_COMPONENT)) {
-      std::optional<Dictionary> record =
-          alarmRecord(*item.document, *item.zones, alarm, fields.start, fields.end);
+      std::optional<Dictionary> record;
+      try {
+        record = alarmRecord(*item.document, *item.zones, alarm, fields.start, fields.end);
+      } catch (const ImportError& fault) {
+        warnings_.fault(fault, "dropped " + ICalDocument::describe(alarm));
+      }
       if (!record) continue;
       std::string id = item.identifier + "#alarm" + std::to_string(++count);
       const std::string& name = *record->stringAt(TesselRecordEntityNameKey);
@@ -319,14 +364,20 @@ class CalendarBuilder {
   }
 
   ICalCalendarSource& source_;
+  ImportWarnings& warnings_;
   std::vector<Item> items_;
   std::map<std::string, std::size_t> positions_;
 };
 
 }  // namespace
 
+ICalCalendar readICalCalendar(ICalCalendarSource source, ImportWarnings& warnings) {
+  return CalendarBuilder(source, warnings).build();
+}
+
 ICalCalendar readICalCalendar(ICalCalendarSource source) {
-  return CalendarBuilder(source).build();
+  ImportWarnings strict(OnFault::Refuse);
+  return CalendarBuilder(source, strict).build();
 }
 
 }  // namespace tessel::importers

@@ -4,6 +4,7 @@
 #include <string>
 #include <vector>
 
+#include "importers/import_warnings.h"
 #include "tessel/record.h"
 
 namespace tessel::importers {
@@ -40,10 +41,14 @@ struct ICalCalendar {
 
 // Reads the VEVENT and VTODO components of the source's files into records of the calendars
 // schema. Identifiers come from the calendar's identifier and each component's UID (and
-// RECURRENCE-ID), so that reading the same source again gives the same identifiers. Raises
-// ImportError naming the file and line of the first fault: text libical refuses, a date that
-// does not exist, a TZID that nothing defines. The source is taken by value so that the text
-// of each file is released once libical has read it.
+// RECURRENCE-ID), so that reading the same source again gives the same identifiers. Each
+// fault goes through `warnings`, naming its file and line: a value libical refuses or a date
+// that does not exist drops its property, or its event or task when that is the start of an
+// event or its RECURRENCE-ID; a time in a TZID that nothing defines is read as a floating
+// time. The source is taken by value so that the text of each file is released once libical
+// has read it.
+ICalCalendar readICalCalendar(ICalCalendarSource source, ImportWarnings& warnings);
+// The same, raising ImportError at the first fault.
 ICalCalendar readICalCalendar(ICalCalendarSource source);
 
 }  // namespace tessel::importers

@@ -16,6 +16,11 @@ ImportError ComponentReader::error(icalproperty* property, std::string reason) c
   return document_.errorAt(property, component_, std::move(reason));
 }
 
+void ComponentReader::drop(const ImportError& fault, icalproperty* property) const {
+  document_.warnings().fault(
+      fault, "dropped the " + name(property) + " of " + ICalDocument::describe(component_));
+}
+
 std::string ComponentReader::name(icalproperty* property) const {
   const char* name = icalproperty_get_property_name(property);
   return name != nullptr ? std::string(name) : std::string("property");
@@ -49,11 +54,12 @@ ReadDate ComponentReader::date(icalproperty* property, const icaltimetype& t,
   }
   if (std::optional<std::string> tzid = parameter(property, "TZID")) {
     std::optional<TimeZone> zone = zones_.zone(*tzid);
-    if (!zone) {
-      throw error(property, name(property) + ": no VTIMEZONE defines the time zone \"" + *tzid +
-                                "\", and it is no IANA or Windows zone name");
-    }
-    return {CalendarDate::fromFields(fields, zoneOfUtcTime(*zone, fields)), false};
+    if (zone) return {CalendarDate::fromFields(fields, zoneOfUtcTime(*zone, fields)), false};
+    document_.warnings().fault(
+        error(property, name(property) + ": no VTIMEZONE defines the time zone \"" + *tzid +
+                            "\", and it is no IANA or Windows zone name"),
+        "read the " + name(property) + " of " + ICalDocument::describe(component_) +
+            " as a floating time");
   }
   return {CalendarDate::fromFields(fields, floatingZone ? *floatingZone : TimeZone::local()),
           false};

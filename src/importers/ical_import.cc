@@ -198,6 +198,13 @@ std::string calendarIdentifierForPath(const fs::path& path) {
 
 std::vector<ICalCalendar> readICalendarPaths(const std::vector<fs::path>& paths,
                                              const std::optional<std::string>& title) {
+  ImportWarnings strict(OnFault::Refuse);
+  return readICalendarPaths(paths, title, strict);
+}
+
+std::vector<ICalCalendar> readICalendarPaths(const std::vector<fs::path>& paths,
+                                             const std::optional<std::string>& title,
+                                             ImportWarnings& warnings) {
   std::vector<ICalCalendar> calendars;
   std::set<std::string> seen;
   for (const fs::path& path : paths) {
@@ -214,7 +221,7 @@ std::vector<ICalCalendar> readICalendarPaths(const std::vector<fs::path>& paths,
     }
     // The same calendar named twice is imported once.
     if (!seen.insert(source.identifier).second) continue;
-    calendars.push_back(readICalCalendar(std::move(source)));
+    calendars.push_back(readICalCalendar(std::move(source), warnings));
   }
   return calendars;
 }

@@ -20,8 +20,13 @@ namespace tessel::importers {
 
 // Reads every path into its calendar. A file's calendar is named by its X-WR-CALNAME, else
 // `title`, else the file name without its extension; a folder's by its vdir "displayname"
-// file, else `title`, else the folder's name. Raises ImportError at the first fault of any
-// file (a path that is neither a file nor a folder included).
+// file, else `title`, else the folder's name. Faults go through `warnings`
+// (readICalCalendar); a path that is neither a file nor a folder, or a file that cannot be
+// read or is not an iCalendar file, raises ImportError.
+std::vector<ICalCalendar> readICalendarPaths(const std::vector<std::filesystem::path>& paths,
+                                             const std::optional<std::string>& title,
+                                             ImportWarnings& warnings);
+// The same, raising ImportError at the first fault of any file.
 std::vector<ICalCalendar> readICalendarPaths(const std::vector<std::filesystem::path>& paths,
                                              const std::optional<std::string>& title);
 

@@ -32,6 +32,7 @@ nlohmann::json toJson(const Source& source) {
                          {"collection", collectionName(source.collection)}};
   if (source.title) json["title"] = *source.title;
   if (source.credentialsFile) json["credentials"] = source.credentialsFile->string();
+  if (source.onFault == importers::OnFault::Skip) json["lenient"] = true;
   return json;
 }
 
@@ -50,6 +51,8 @@ Result<Source> fromJson(const nlohmann::json& json) {
     source.title = json["title"].get<std::string>();
   if (json.contains("credentials") && json["credentials"].is_string())
     source.credentialsFile = fs::path(json["credentials"].get<std::string>());
+  if (json.contains("lenient") && json["lenient"] == true)
+    source.onFault = importers::OnFault::Skip;
   return source;
 }
 

@@ -6,6 +6,7 @@
 #include <string_view>
 #include <vector>
 
+#include "importers/import_options.h"
 #include "platform/result.h"
 
 namespace tessel::sources {
@@ -24,6 +25,10 @@ struct Source {
   std::optional<std::string> title;
   // The file with "USER:PASSWORD" for HTTP basic authentication.
   std::optional<std::filesystem::path> credentialsFile;
+  // What a fault in its text costs. Refuse by default: a refresh runs unattended (when a player
+  // is plugged in), and a source it cannot wholly read keeps what the store had of it rather
+  // than losing an event or a property; Skip reads it as `tessel import` does, with warnings.
+  importers::OnFault onFault = importers::OnFault::Refuse;
 
   bool isAddress() const { return isAddress(location); }
   static bool isAddress(std::string_view location);

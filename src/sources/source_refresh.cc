@@ -8,6 +8,7 @@
 
 #include "importers/ical_import.h"
 #include "importers/import_error.h"
+#include "importers/import_warnings.h"
 #include "importers/stable_hash.h"
 #include "importers/vcard_identifiers.h"
 #include "importers/vcard_import.h"
@@ -61,16 +62,17 @@ std::string counted(std::size_t count, const char* one, const char* many) {
   return std::to_string(count) + " " + (count == 1 ? one : many);
 }
 
-std::string refreshCalendar(Store& store, const Source& source, std::optional<std::string> text) {
+std::string refreshCalendar(Store& store, const Source& source, std::optional<std::string> text,
+                            importers::ImportWarnings& warnings) {
   std::vector<importers::ICalCalendar> calendars;
   if (text) {
     importers::ICalCalendarSource read;
     read.identifier = calendarIdentifierForAddress(source.location);
     read.files.push_back({source.location, std::move(*text)});
     read.fallbackTitle = source.title ? *source.title : titleOfAddress(source.location);
-    calendars.push_back(importers::readICalCalendar(std::move(read)));
+    calendars.push_back(importers::readICalCalendar(std::move(read), warnings));
   } else {
-    calendars = importers::readICalendarPaths({source.location}, source.title);
+    calendars = importers::readICalendarPaths({source.location}, source.title, warnings);
   }
   const importers::ICalImportCounts counts =
       importers::writeICalCalendars(store, calendars, SyncDeletes::On);
@@ -123,8 +125,9 @@ std::vector<std::string> staleRecords(const Store& store, const std::vector<std:
 
 std::string refreshAddressBook(Store& store, const Source& source,
                                const std::vector<Source>& sources, const SourceStates& states,
-                               std::optional<std::string> text, SourceState& state) {
-  importers::VCardImport import;
+                               std::optional<std::string> text, importers::ImportWarnings& warnings,
+                               SourceState& state) {
+  importers::VCardImport import(warnings);
   if (text)
     import.addText(*text, source.location);
   else
@@ -147,7 +150,8 @@ std::string refreshAddressBook(Store& store, const Source& source,
 
 SourceRefresh refreshOne(Store& store, const Source& source, const std::vector<Source>& sources,
                          const SourceStates& states, HttpClient& http) {
-  SourceRefresh outcome{source, RefreshResult::Failed, {}};
+  SourceRefresh outcome;
+  outcome.source = source;
   SourceState state = states.load(source);
   std::optional<std::string> text;
   if (source.isAddress()) {
@@ -165,10 +169,15 @@ SourceRefresh refreshOne(Store& store, const Source& source, const std::vector<S
     state.validators = std::move(fetched->validators);
   }
   try {
+    importers::ImportWarnings warnings(source.onFault);
     outcome.detail =
         source.collection == Collection::Calendar
-            ? refreshCalendar(store, source, std::move(text))
-            : refreshAddressBook(store, source, sources, states, std::move(text), state);
+            ? refreshCalendar(store, source, std::move(text), warnings)
+            : refreshAddressBook(store, source, sources, states, std::move(text), warnings, state);
+    for (const importers::ImportWarning& warning : warnings.all())
+      outcome.warnings.push_back(importers::warningText(warning));
+    if (warnings.count() != 0)
+      outcome.detail += "; " + counted(warnings.count(), "warning", "warnings");
   } catch (const importers::ImportError& error) {
     outcome.detail = error.what();
     return outcome;

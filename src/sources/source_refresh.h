@@ -19,6 +19,8 @@ struct SourceRefresh {
   Source source;
   RefreshResult result = RefreshResult::Failed;
   std::string detail;
+  // What a lenient source's text cost, one warningText each (importers/import_warnings.h).
+  std::vector<std::string> warnings;
 };
 
 // Brings every source into the store, in the list's order, through the importers. What left a

@@ -10,6 +10,7 @@
 #include <string>
 #include <vector>
 
+#include "importers/import_warnings.h"
 #include "support/files.h"
 #include "tessel/record_json.h"
 #include "tessel/schema.h"
@@ -54,9 +55,11 @@ std::string calendarText(const std::string& body) {
 // only by their VTIMEZONE (a southern-hemisphere daylight rule, one that ended), vendor
 // prefixes before IANA names, floating times, and tasks with "/" and "#" in their UID; and
 // habits.ics: LF or CR line ends, a byte order mark, a fold inside a UTF-8 character, blank
-// lines, empty values and libical's own X-LIC-ERROR remarks.
+// lines, empty values and libical's own X-LIC-ERROR remarks; phone_1_0.vcs: vCalendar 1.0's
+// quoted-printable Latin-1, recurrence grammar, alarms, lists and status words.
 TEST(ICalImportReading, EachExportBecomesTheRecordsOfItsReferenceFile) {
-  for (const char* source : {"outlook.ics", "google.ics", "custom_zone.ics", "habits.ics"}) {
+  for (const char* source :
+       {"outlook.ics", "google.ics", "custom_zone.ics", "habits.ics", "phone_1_0.vcs"}) {
     SCOPED_TRACE(source);
     const ICalCalendar calendar = readDataFile(source);
     std::string lines = "title " + calendar.title + ", " + std::to_string(calendar.eventCount) +
@@ -90,17 +93,34 @@ TEST(ICalImportReading, TitlesAndIdentifiers) {
   EXPECT_CONTAINS(json(twice, "cal/event/a"), R"("summary":"new")");
 }
 
-// Every file of malformed/ is refused with its line and reason, compared with
+// Every file of malformed/, after a good file: with OnFault::Refuse, refused with its line and
+// reason; with OnFault::Skip, what is kept and each warning. Compared with
 // golden/ical/malformed.txt.
-TEST(ICalImportReading, MalformedInputNamesFileAndLine) {
+TEST(ICalImportReading, MalformedInputCostsWhatCannotBeReadOrWithRefuseEverything) {
   std::string faults;
+  const auto line = [](std::optional<std::size_t> number) {
+    return "line " + std::to_string(number.value_or(0)) + ": ";
+  };
   for (const std::string& name : zt::test_support::namesIn(kData / "malformed")) {
+    const std::vector<fs::path> paths = {kData / "outlook.ics", kData / "malformed" / name};
     try {
-      readICalendarPaths({kData / "outlook.ics", kData / "malformed" / name}, std::nullopt);
+      readICalendarPaths(paths, std::nullopt);
       faults += name + ": accepted\n";
     } catch (const ImportError& e) {
       EXPECT_EQ(e.source(), (kData / "malformed" / name).string());
-      faults += name + ": line " + std::to_string(e.line().value_or(0)) + ": " + e.reason() + "\n";
+      faults += name + ": " + line(e.line()) + e.reason() + "\n";
+    }
+    ImportWarnings warnings(OnFault::Skip);
+    try {
+      const std::vector<ICalCalendar> read = readICalendarPaths(paths, std::nullopt, warnings);
+      faults += "  kept " + std::to_string(read.back().eventCount) + " events, " +
+                std::to_string(read.back().taskCount) + " tasks\n";
+    } catch (const ImportError& e) {
+      faults += "  refused: " + line(e.line()) + e.reason() + "\n";
+    }
+    for (const ImportWarning& warning : warnings.all()) {
+      EXPECT_EQ(warning.source, (kData / "malformed" / name).string());
+      faults += "  warning: " + line(warning.line) + warning.message + "\n";
     }
   }
   EXPECT_TRUE(zt::test_support::matchesGoldenFile(

@@ -28,6 +28,9 @@ RefreshOutcome refreshSources(CommandContext& context) {
                     << "; the store keeps what it had from it\n";
           return;
         }
+        context.out().flush();
+        for (const std::string& warning : refresh.warnings)
+          std::cerr << "tessel: source " << source.identifier << ": warning: " << warning << '\n';
         ++(refresh.result == sources::RefreshResult::Imported ? outcome.imported
                                                               : outcome.unchanged);
         context.out() << source.identifier << ' ' << sources::collectionName(source.collection)

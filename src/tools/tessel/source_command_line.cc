@@ -18,6 +18,7 @@ void addSourceCommands(CLI::App& app, CommandLine& line) {
     bool addressBook = false;
     std::optional<std::string> title;
     std::optional<std::string> credentials;
+    bool lenient = false;
     std::string removed;
   };
   auto options = std::make_shared<Options>();
@@ -41,12 +42,17 @@ void addSourceCommands(CLI::App& app, CommandLine& line) {
                   "Title of the calendar when the source names none; a label for an address book");
   add->add_option("--credentials", options->credentials,
                   "File whose first line is USER:PASSWORD for the address (chmod 600)");
+  add->add_flag("--lenient", options->lenient,
+                "Read it as `tessel import` does: a fault costs only what cannot be read, with a "
+                "warning (default: the source keeps what it brought before, and the refresh says "
+                "why)");
   add->callback([&line, options] {
     line.command = [options](CommandContext& context) {
       std::optional<sources::Collection> collection;
       if (options->calendar) collection = sources::Collection::Calendar;
       if (options->addressBook) collection = sources::Collection::AddressBook;
-      addSource(context, options->location, collection, options->title, options->credentials);
+      addSource(context, options->location, collection, options->title, options->credentials,
+                options->lenient ? importers::OnFault::Skip : importers::OnFault::Refuse);
     };
   });
 

@@ -60,10 +60,11 @@ Collection collectionOfAddress(const Source& source) {
 
 void addSource(CommandContext& context, const std::string& location,
                std::optional<Collection> collection, const std::optional<std::string>& title,
-               const std::optional<std::string>& credentialsFile) {
+               const std::optional<std::string>& credentialsFile, importers::OnFault onFault) {
   SourceList list = loadList();
   Source source;
   source.title = title;
+  source.onFault = onFault;
   if (Source::isAddress(location)) {
     refuseUserInAddress(location);
     source.location = location;
@@ -111,6 +112,7 @@ void listSources(CommandContext& context) {
     if (source.title) context.out() << "\ttitle: " << *source.title;
     if (source.credentialsFile)
       context.out() << "\tcredentials: " << source.credentialsFile->string();
+    if (source.onFault == importers::OnFault::Skip) context.out() << "\tlenient";
     context.out() << '\n';
   }
 }

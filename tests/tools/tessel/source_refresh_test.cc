@@ -152,6 +152,16 @@ TEST_F(SourceRefresh, PlainServerAnswersUnchangedAndABrokenDownloadKeepsTheStore
     EXPECT_CONTAINS(events, "Dentist");
     EXPECT_EQ(splitLines(events).size(), 1u);
   }
+
+  // A lenient source is read as `tessel import` reads: a fault costs what it is in.
+  std::string lunch = eventText("l1", "Lunch");
+  lunch.insert(lunch.find("SUMMARY"), "RRULE:FREQ=NEVER\r\n");
+  writeFile(dir_ / "lunch.ics", lunch);
+  ASSERT_EQ(tessel({"source", "add", (dir_ / "lunch.ics").string(), "--lenient"}).status, 0);
+  run = tessel({"refresh"});
+  EXPECT_CONTAINS(run.err, "tessel: source 2: warning: ");
+  EXPECT_CONTAINS(run.err, "dropped the RRULE of the event \"Lunch\"");
+  EXPECT_CONTAINS(tessel({"records", "list", "--entity", "tessel.calendars.Event"}).out, "Lunch");
 }
 
 }  // namespace
