@@ -149,6 +149,10 @@ class CurlHttpClient : public HttpClient {
     char* effective = nullptr;
     curl_easy_getinfo(curl, CURLINFO_EFFECTIVE_URL, &effective);
     response.finalUrl = effective != nullptr ? effective : url;
+    // "Not modified" means nothing when nothing was asked about: there is no copy to keep.
+    if (status == 304 && previous.empty())
+      return {Error{url + ": the server answered 304 Not Modified to an unconditional request"},
+              Failure::Other};
     if (status == 304) {
       response.freshness = Freshness::NotModified;
       response.validators = previous;

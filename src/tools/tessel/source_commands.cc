@@ -1,10 +1,12 @@
 #include "tools/tessel/source_commands.h"
 
 #include <filesystem>
+#include <iostream>
 #include <ostream>
 #include <stdexcept>
 #include <system_error>
 
+#include "platform/ascii.h"
 #include "sources/collection_text.h"
 #include "sources/credentials.h"
 #include "sources/http_client.h"
@@ -34,6 +36,20 @@ void refuseUserInAddress(const std::string& address) {
     throw UsageError(
         "the address carries a user name: put USER:PASSWORD in a file only you "
         "can read and name it with --credentials");
+}
+
+// Basic authentication over http beyond this machine (RFC 7617, section 4: the password is
+// only encoded). A server on the loopback address is reached without a network in between.
+bool sendsPasswordInClear(const std::string& address) {
+  if (!zt::platform::lowerAscii(address).starts_with("http://")) return false;
+  const std::size_t start = address.find("://") + 3;
+  std::string host = address.substr(start, address.find_first_of("/?#", start) - start);
+  if (host.starts_with("["))
+    host = host.substr(0, host.find(']') + 1);
+  else
+    host = host.substr(0, host.find(':'));
+  host = zt::platform::lowerAscii(host);
+  return host != "localhost" && host != "[::1]" && !host.starts_with("127.");
 }
 
 Collection collectionOfAddress(const Source& source) {
@@ -72,6 +88,9 @@ void addSource(CommandContext& context, const std::string& location,
       source.credentialsFile = fs::absolute(*credentialsFile);
       auto read = sources::readCredentials(*source.credentialsFile);
       if (!read) throw std::runtime_error(read.error());
+      if (sendsPasswordInClear(location))
+        std::cerr << "tessel: warning: the password goes over plain http, readable on the way; "
+                     "use the https address if the server has one\n";
     }
   } else {
     if (location.find("://") != std::string::npos)
