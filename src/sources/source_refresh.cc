@@ -128,10 +128,14 @@ std::string refreshAddressBook(Store& store, const Source& source,
                                std::optional<std::string> text, importers::ImportWarnings& warnings,
                                SourceState& state) {
   importers::VCardImport import(warnings);
-  if (text)
-    import.addText(*text, source.location);
-  else
+  if (!text) {
     import.addPaths({source.location});
+  } else if (text->find_first_not_of(" \r\n") != std::string::npos) {
+    import.addText(*text, source.location);
+  }
+  // Else the server sent an emptied address book as nothing at all (checkDownload allowed it
+  // for a vCard answer): every contact left it. The importer would refuse the empty text as a
+  // file that is not a vCard file.
   const std::vector<std::string> produced = producedIdentifiers(import);
   std::set<std::string> elsewhere;
   for (const Source& other : sources) {

@@ -105,6 +105,16 @@ TEST_F(SourceRefresh, RadicaleCollectionsComeInLeaveTheStoreAndSurviveAWrongPass
   EXPECT_FALSE(contains(run.err + run.out, "not-the-secret"));
   EXPECT_EQ(count("tessel.calendars.Event"), 1u);
   EXPECT_EQ(count("tessel.contacts.Contact"), 2u);
+
+  // An emptied collection is exported as nothing at all (an address book) or as a calendar of
+  // no events, and empties the store of what it brought.
+  writeCredentials("alice:secret");
+  ASSERT_EQ(radicale.request("DELETE", "work/e1.ics"), "200");
+  ASSERT_EQ(radicale.request("DELETE", "people/c1.vcf"), "200");
+  run = tessel({"refresh"});
+  ASSERT_EQ(run.status, 0) << run.err;
+  EXPECT_EQ(count("tessel.calendars.Event"), 0u);
+  EXPECT_EQ(count("tessel.contacts.Contact"), 1u);
 }
 
 TEST_F(SourceRefresh, PlainServerAnswersUnchangedAndABrokenDownloadKeepsTheStore) {
