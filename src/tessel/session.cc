@@ -302,16 +302,19 @@ void Session::prepareToPullChanges(const std::vector<std::string>& entityNames) 
     insert.run();
   };
 
-  // One pass over truth joined with the mirror, in the order truth changed. Records are
-  // decoded only when a filter must judge them. The unary + keeps SQLite walking the
-  // generation index instead of sorting every record (blobs included) by generation.
+  // One pass over truth joined with the mirror, in the order truth changed. The pass never
+  // names the data column: SQLite builds a result row whole, so naming it would read every
+  // record, pictures included, judged or not. A record is read and decoded only when a filter
+  // must judge it. The unary + keeps SQLite walking the generation index instead of sorting
+  // every record by generation.
   {
     Statement truth(connection,
-                    "SELECT r.key, r.id, r.entity, r.generation, r.deleted, r.data, m.generation "
+                    "SELECT r.key, r.id, r.entity, r.generation, r.deleted, m.generation "
                     "FROM main.records r LEFT JOIN main.mirror m "
                     "ON m.client_id = ?1 AND m.record_id = r.id "
                     "WHERE +r.entity IN (" +
                         inList + ") ORDER BY r.generation");
+    Statement data(connection, "SELECT data FROM main.records WHERE key = ?");
     bindEntities(truth);
     while (truth.step()) {
       std::string_view id = truth.text(1);
@@ -319,11 +322,15 @@ void Session::prepareToPullChanges(const std::vector<std::string>& entityNames) 
       std::int64_t generation = truth.integer(3);
       const TruthState state = truth.integer(4) != 0 ? TruthState::Gone : TruthState::Live;
       std::optional<std::int64_t> held;
-      if (!truth.isNull(6)) held = truth.integer(6);
+      if (!truth.isNull(5)) held = truth.integer(5);
       const EntityRule& rule = ruleOf(entity);
       FilterVerdict verdict = FilterVerdict::Passes;
       if (state == TruthState::Live && !rule.judges.empty()) {
-        verdict = judge(rule.judges, detail::decodeRecord(truth.blob(5)), std::string(id));
+        StatementReset reset(data);
+        data.bind(1, truth.integer(0));
+        if (data.step()) {
+          verdict = judge(rule.judges, detail::decodeRecord(data.blob(0)), std::string(id));
+        }
       }
       add(id, truth.integer(0), entity, decidePull(state, generation, held, verdict, rule.mode),
           generation);
