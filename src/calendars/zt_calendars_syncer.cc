@@ -203,6 +203,8 @@ bool ZTCalendarsSyncer::doSync() {
       progress += step;
       _syncManager.notifyTesselWithPhase(kUploadingPhase, progress, dataClass);
     }
+    // The texts of this run are all the cache keeps.
+    if (_textCache) _textCache->prune();
     return _syncManager.commitAcceptedChanges();
   }();
   _syncManager.notifyTesselWithPhase(kUploadingPhase, 100.0f, dataClass);
