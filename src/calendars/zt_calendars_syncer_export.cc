@@ -152,7 +152,9 @@ bool ZTCalendarsSyncer::uploadChangesForCalendarWithID(const std::string& /*cale
   std::filesystem::path path =
       folder ? std::filesystem::path(*folder) / fileName : std::filesystem::path(fileName);
   const platform::FolderHandle* calendars = _syncManager.zetoCalendarsFolder();
-  if (!calendars || !calendars->atomicWrite(fileName, data)) {
+  // Each file's content is on the disk before its rename; the folder is synced once, after
+  // the last calendar (doSync).
+  if (!calendars || !calendars->atomicWrite(fileName, data, platform::Durability::FolderLater)) {
     Log::debug("Can't write calendar at path %@", path.string());
     _syncManager.setLastStatus(sync::kStatusWriteFailed);
     return false;
