@@ -11,7 +11,6 @@
 #include "platform/identity.h"
 #include "platform/log.h"
 #include "platform/sha256.h"
-#include "platform/time_zone.h"
 #include "sync/sync_status.h"
 #include "sync/zt_sync_manager.h"
 #include "tessel/exception.h"
@@ -55,7 +54,7 @@ std::optional<CalendarTextCache::Key> ZTCalendarsSyncer::textKey(const std::stri
     platform::Result<std::string> program = platform::programBuildIdentity();
     platform::Result<std::string> store = platform::fileIdentity(_syncManager.services().storePath);
     platform::Result<std::string> zones = platform::timeZoneDatabaseIdentity();
-    std::optional<std::string> localZone = platform::TimeZone::local().name();
+    platform::Result<std::string> localZone = platform::localTimeZoneSettingIdentity();
     if (program && store && zones && localZone) {
       const tessel::RecordsVersion version =
           calendarTruthSnapshot()->versionOfEntities(sync::ZTSyncManager::entitiesForCalendars());

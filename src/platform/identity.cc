@@ -4,8 +4,10 @@
 #include <fcntl.h>
 #include <link.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
 #include <cerrno>
+#include <cstdlib>
 #include <cstring>
 #include <string_view>
 
@@ -73,7 +75,33 @@ std::string placement(const struct statx& status) {
          std::to_string(status.stx_btime.tv_nsec);
 }
 
+// A setting file's identity with its size and modification time, or "none" when missing.
+std::string settingFile(const char* path) {
+  struct statx status {};
+  if (statx(AT_FDCWD, path, AT_SYMLINK_NOFOLLOW, STATX_INO | STATX_SIZE | STATX_MTIME | STATX_TYPE,
+            &status) != 0) {
+    return "none";
+  }
+  std::string text =
+      std::to_string(status.stx_dev_major) + ":" + std::to_string(status.stx_dev_minor) + ":" +
+      std::to_string(status.stx_ino) + ":" + std::to_string(status.stx_size) + ":" +
+      std::to_string(status.stx_mtime.tv_sec) + "." + std::to_string(status.stx_mtime.tv_nsec);
+  if (S_ISLNK(status.stx_mode)) {
+    char target[4096];
+    const ssize_t length = ::readlink(path, target, sizeof target);
+    if (length > 0) text += ">" + std::string(target, static_cast<std::size_t>(length));
+  }
+  return text;
+}
+
 }  // namespace
+
+Result<std::string> localTimeZoneSettingIdentity() {
+  const char* tz = std::getenv("TZ");
+  return std::string("TZ=") + (tz ? "set:" + std::string(tz) : "unset") +
+         ";localtime=" + settingFile("/etc/localtime") +
+         ";timezone=" + settingFile("/etc/timezone");
+}
 
 Result<std::string> programBuildIdentity() {
   static const std::string identity = [] {

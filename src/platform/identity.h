@@ -25,4 +25,8 @@ Result<std::string> fileIdentity(const std::filesystem::path& path);
 // database replaces), and its size and modification time.
 Result<std::string> timeZoneDatabaseIdentity();
 
+// What the local time zone is chosen from, read without loading the time-zone database:
+// $TZ, and /etc/localtime (where it leads, or the file itself) and /etc/timezone.
+Result<std::string> localTimeZoneSettingIdentity();
+
 }  // namespace zt::platform
