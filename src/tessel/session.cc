@@ -273,8 +273,7 @@ void Session::prepareToPullChanges(const std::vector<std::string>& entityNames) 
   const FilterList filters = storedFilters(connection, client);
   const std::vector<EntityRule> rules =
       entityRules(entities, state_->entityNamesToReplace, filters);
-  // A handful of entities: a linear search beats hashing a fresh string per record. None for
-  // an entity the session does not prepare.
+  // None for an entity this preparation leaves out.
   auto findRule = [&](std::string_view entity) -> const EntityRule* {
     for (const EntityRule& rule : rules) {
       if (rule.name == entity) return &rule;
