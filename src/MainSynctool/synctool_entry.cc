@@ -17,6 +17,7 @@
 #include "platform/file_system.h"
 #include "platform/log.h"
 #include "platform/notification_center.h"
+#include "platform/process_memory.h"
 #include "platform/run_loop.h"
 #include "platform/terminal.h"
 #include "platform/user_defaults.h"
@@ -106,6 +107,9 @@ int synctoolMain(int argc, const char* const argv[]) {
     return 1;
   }
 
+  // The photo conversions of a first sync run on several threads; what one frees, the next
+  // batch reuses instead of each thread keeping its own.
+  platform::useOneMemoryArena();
   Log::debug("Starting sync for Zeto with ID %@", *syncClientID);
   static Tool* tool = new Tool;
   auto report = std::make_shared<RunReport>();

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <array>
 #include <cstddef>
+#include <functional>
 #include <utility>
 #include <vector>
 
@@ -184,7 +185,8 @@ bool isEvent(const Dictionary& record) {
 // to the events that name them. A record named by one event only is moved out and released.
 class SubRecords {
  public:
-  SubRecords(const tessel::Snapshot& snapshot, const tessel::RecordMap& entities) {
+  SubRecords(const tessel::Snapshot& snapshot, const tessel::RecordMap& entities,
+             const std::function<void(std::size_t, const tessel::RecordMap&)>& note) {
     std::vector<std::string_view> all;
     for (const auto& [identifier, record] : entities) {
       if (!isEvent(record)) continue;
@@ -208,6 +210,7 @@ class SubRecords {
       unique.emplace_back(all[i]);
     }
     records_ = snapshot.recordsWithIdentifiers(unique);
+    note(unique.size(), records_);
   }
 
   // What CalendarFlattener::appendCalSubEntities stores for these identifiers.
@@ -367,9 +370,22 @@ bool CalendarFlattener::appendCalEntity(const Dictionary& record, Array* eventAr
       });
 }
 
+void CalendarFlattener::Reads::note(std::size_t requested, const tessel::RecordMap& found) {
+  if (found.size() != requested) missed = true;
+  for (const auto& [identifier, record] : found) {
+    const std::string* entity = record.stringAt(TesselRecordEntityNameKey);
+    if (!entity) {
+      missed = true;
+      continue;
+    }
+    if (!entities.contains(*entity)) entities.insert(*entity);
+  }
+}
+
 std::optional<Dictionary> CalendarFlattener::flattenCalendar(const Dictionary& calendar,
                                                              const std::string& title,
                                                              std::size_t order) const {
+  reads_ = Reads{};
   Dictionary flattened;
   flattened.set(TesselAttribute_Calendars_Calendar_Title, title);
   flattened.set(TesselEntity_Calendars_CalendarOrder, orderString(order));
@@ -393,9 +409,16 @@ std::optional<Dictionary> CalendarFlattener::flattenCalendar(const Dictionary& c
   if (eventsValue || tasksValue) {
     // One request for the whole calendar; the same map answers the detached occurrences.
     tessel::RecordMap allEntities = snapshot_.recordsWithIdentifiers(members);
+    std::sort(members.begin(), members.end());
+    reads_.note(
+        static_cast<std::size_t>(std::unique(members.begin(), members.end()) - members.begin()),
+        allEntities);
     members = {};
     // And one request for all the records the events relate to.
-    SubRecords subRecords(snapshot_, allEntities);
+    SubRecords subRecords(snapshot_, allEntities,
+                          [this](std::size_t requested, const tessel::RecordMap& found) {
+                            reads_.note(requested, found);
+                          });
     auto appendSubEntities = [&subRecords](const Array& identifiers, KeyList keys,
                                            std::string_view icalKey, Dictionary& event) {
       subRecords.append(identifiers, keys, icalKey, event);

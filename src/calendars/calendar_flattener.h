@@ -7,6 +7,7 @@
 
 #include <cstddef>
 #include <optional>
+#include <set>
 #include <span>
 #include <string>
 #include <string_view>
@@ -45,6 +46,12 @@ class CalendarFlattener {
   bool appendCalEntity(const platform::Dictionary& record, platform::Array* eventArray,
                        platform::Array* taskArray, const tessel::RecordMap& allEntities) const;
 
+  // What the last flattenCalendar read besides the calendar record: whether an identifier it
+  // looked up named no record of the snapshot, and the entity names of the records it found.
+  // Its result depends on those records alone only when none was missing.
+  bool missedRecord() const { return reads_.missed; }
+  const std::set<std::string>& entitiesRead() const { return reads_.entities; }
+
   // "1l" for the first calendar: the number followed by a letter l, which devices expect in
   // X-WR-CALORDER.
   static std::string orderString(std::size_t order);
@@ -63,7 +70,15 @@ class CalendarFlattener {
   static KeyList keysForExDates();
 
  private:
+  struct Reads {
+    bool missed = false;
+    std::set<std::string> entities;
+    // Notes what a lookup of `requested` distinct identifiers found.
+    void note(std::size_t requested, const tessel::RecordMap& found);
+  };
+
   const tessel::Snapshot& snapshot_;
+  mutable Reads reads_;
 };
 
 }  // namespace zt::calendars

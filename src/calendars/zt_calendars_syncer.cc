@@ -203,6 +203,17 @@ bool ZTCalendarsSyncer::doSync() {
       progress += step;
       _syncManager.notifyTesselWithPhase(kUploadingPhase, progress, dataClass);
     }
+    // One sync of the folder makes the removals and every file's rename durable, before the
+    // changes are committed.
+    if (count > 0) {
+      if (platform::Result<void> synced = _syncManager.zetoCalendarsFolder()->sync(); !synced) {
+        Log::debug("Can't write calendar at path %@", synced.error());
+        _syncManager.setLastStatus(sync::kStatusWriteFailed);
+        return false;
+      }
+    }
+    // The texts of this run are all the cache keeps.
+    if (_textCache) _textCache->prune();
     return _syncManager.commitAcceptedChanges();
   }();
   _syncManager.notifyTesselWithPhase(kUploadingPhase, 100.0f, dataClass);

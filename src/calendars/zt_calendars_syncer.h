@@ -9,6 +9,7 @@
 #include <string>
 #include <vector>
 
+#include "calendars/calendar_text_cache.h"
 #include "filters/zeto_calendar_filter.h"
 #include "sync/data_class_syncer.h"
 #include "tessel/snapshot.h"
@@ -59,6 +60,11 @@ class ZTCalendarsSyncer final : public sync::CalendarsSyncing {
   bool uploadChangesForCalendarWithID(const std::string& calendarID,
                                       std::span<const std::uint8_t> data, const std::string& name);
 
+  // The key of a calendar's text in the cache of kept texts: everything the text depends on.
+  // None when the cache is off or something the text depends on cannot be told.
+  std::optional<CalendarTextCache::Key> textKey(const std::string& calendarID,
+                                                const std::string& title, std::size_t order);
+
   // The calendars to write, in the player's order.
   const std::vector<std::string>& allCalIDs() const { return _allCalIDs; }
 
@@ -73,6 +79,11 @@ class ZTCalendarsSyncer final : public sync::CalendarsSyncing {
   // Made empty by getChanges and never filled: calendars are written one at a time.
   std::map<std::string, std::vector<std::uint8_t>> _allCalsAsData;
   std::shared_ptr<tessel::Snapshot> _calendarTruthSnapshot;
+  std::unique_ptr<CalendarTextCache> _textCache;
+  // What every calendar's key shares, worked out at the first calendar; none when the
+  // texts are not to be kept.
+  std::optional<std::string> _textKeyContext;
+  bool _textKeyContextInited = false;
 };
 
 // The maker the tool's entry gives the manager.

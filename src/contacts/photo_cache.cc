@@ -1,13 +1,13 @@
 #include "contacts/photo_cache.h"
 
 #include <atomic>
-#include <cstdlib>
 #include <cstring>
 #include <string_view>
 #include <vector>
 
 #include "contacts/contact_photo.h"
 #include "platform/sha256.h"
+#include "platform/user_cache.h"
 
 namespace zt::contacts {
 
@@ -98,28 +98,7 @@ bool isLasting(const PhotoConversion& conversion) {
 }
 
 std::unique_ptr<PhotoCache> PhotoCache::openUserCache() {
-  std::filesystem::path base;
-  const char* xdg = std::getenv("XDG_CACHE_HOME");
-  const char* home = std::getenv("HOME");
-  if (xdg && xdg[0] == '/') {
-    base = xdg;
-  } else if (home && home[0] == '/') {
-    base = std::filesystem::path(home) / ".cache";
-  } else {
-    return nullptr;
-  }
-  platform::Result<platform::FolderHandle> opened = platform::FolderHandle::open(base);
-  if (!opened) {
-    std::error_code ignored;
-    if (!std::filesystem::create_directories(base, ignored)) return nullptr;
-    opened = platform::FolderHandle::open(base);
-  }
-  if (!opened) return nullptr;
-  platform::Result<platform::FolderHandle> tool =
-      opened->openChild("zetosynctool", platform::IfMissing::Create);
-  if (!tool) return nullptr;
-  platform::Result<platform::FolderHandle> photos =
-      tool->openChild("photos", platform::IfMissing::Create);
+  platform::Result<platform::FolderHandle> photos = platform::openUserCacheFolder("photos");
   if (!photos) return nullptr;
   return std::unique_ptr<PhotoCache>(new PhotoCache(std::move(photos).value(), kDefaultSizeCap));
 }

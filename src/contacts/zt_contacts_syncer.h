@@ -1,5 +1,6 @@
 #pragma once
 
+#include <cstdint>
 #include <memory>
 #include <optional>
 #include <set>
@@ -7,6 +8,7 @@
 #include <string_view>
 
 #include "filters/zeto_contact_filter.h"
+#include "platform/atomic_file.h"
 #include "sync/data_class_syncer.h"
 #include "tessel/change_enumerator.h"
 #include "tessel/snapshot.h"
@@ -36,11 +38,12 @@ class ZTContactsSyncer final : public sync::ContactsSyncing {
 
   // Accepts the changes and decides whether to push (shouldPushFile).
   bool getChanges();
-  // Builds the file image (allVCardData): one card per selected contact, in UTF-16BE after
-  // one byte-order mark; no bytes at all when no contact is selected.
+  // Builds the file: one card per selected contact, in UTF-16BE after one byte-order mark; no
+  // bytes at all when no contact is selected. The cards go to a temporary file beside
+  // Tessel.vcf as they are made, so the whole text is never in memory.
   bool disassembleData();
-  // Writes the file image to the player, remembers its date and the photo setting with the
-  // sync client, and commits the accepted changes.
+  // Puts the built file in place on the player, remembers its date and the photo setting with
+  // the sync client, and commits the accepted changes.
   bool uploadChanges();
 
   // The session's truth snapshot, fetched at the first call.
@@ -51,7 +54,6 @@ class ZTContactsSyncer final : public sync::ContactsSyncing {
   bool shouldApplyContactGroupWithIdentifier(const std::string& identifier) override;
 
   bool shouldPushFile() const { return _shouldPushFile; }
-  const std::string& allVCardData() const { return _allVCardData; }
 
   static constexpr std::string_view kFileName = "Tessel.vcf";
   // Settings kept with the sync client: the date of the file last written, and whether it
@@ -63,6 +65,10 @@ class ZTContactsSyncer final : public sync::ContactsSyncing {
   bool fileOnZetoNeedsPush();
   bool photoSettingNeedsPush();
   bool isSelected(const platform::Dictionary& contact);
+  // Appends UTF-16BE bytes to the file being built; writes them out once enough are waiting,
+  // or all of them with Flush::All.
+  enum class Flush { WhenFull, All };
+  void appendToFile(std::string_view utf8, Flush flush);
 
   sync::ZTSyncManager& _syncManager;
   // Declared and never used: the manager keeps the status.
@@ -70,7 +76,11 @@ class ZTContactsSyncer final : public sync::ContactsSyncing {
   std::shared_ptr<filters::ZetoContactFilter> _contactFilter;
   std::optional<tessel::ChangeEnumerator> _contactChangeEnumerator;
   std::shared_ptr<tessel::Snapshot> _contactTruthSnapshot;
-  std::string _allVCardData;
+  // The file being built: its temporary file on the player (none when it could not be made
+  // or a write failed, and the upload then fails), the bytes not yet written, and the size.
+  std::optional<platform::AtomicFile> _vcardFile;
+  std::string _vcardPending;
+  std::uint64_t _vcardSize = 0;
   bool _shouldPushFile = false;
   std::optional<std::set<std::string>> _filteredGroups;
 };

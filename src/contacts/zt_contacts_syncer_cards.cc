@@ -35,9 +35,37 @@ constexpr std::size_t kPhotoBatch = 512;
 
 }  // namespace
 
+void ZTContactsSyncer::appendToFile(std::string_view utf8, Flush flush) {
+  // Enough to keep the writes few; little beside a card's photo.
+  constexpr std::size_t kWriteSize = std::size_t{1} << 20;
+  const std::size_t before = _vcardPending.size();
+  platform::utf16::appendBigEndian(_vcardPending, utf8);
+  _vcardSize += _vcardPending.size() - before;
+  if (_vcardPending.size() < kWriteSize && flush == Flush::WhenFull) return;
+  if (_vcardFile) {
+    const std::span<const std::uint8_t> bytes(
+        reinterpret_cast<const std::uint8_t*>(_vcardPending.data()), _vcardPending.size());
+    // A failed write removes the temporary file; the upload then reports the failure.
+    if (!_vcardFile->write(bytes)) _vcardFile.reset();
+  }
+  _vcardPending.clear();
+}
+
 bool ZTContactsSyncer::disassembleData() {
   Log::debug("Disassembling data");
-  _allVCardData.clear();
+  _vcardFile.reset();
+  _vcardPending.clear();
+  _vcardSize = 0;
+  // A run that was killed, or a player pulled, between the write of the temporary file and
+  // its rename left a full-size hidden copy behind. The device lock keeps any other sync from
+  // writing meanwhile, so every such copy is stale; one that cannot be removed is no reason
+  // not to write. Without a folder on the player there is nowhere to write, which the upload
+  // reports.
+  if (const platform::FolderHandle* contacts = _syncManager.zetoContactsFolder()) {
+    const std::string fileName(kFileName);
+    (void)contacts->removeStaleTemporaries(fileName);
+    _vcardFile = platform::AtomicFile::create(*contacts, fileName).valueOrNone();
+  }
   try {
     std::shared_ptr<tessel::Snapshot> snapshot = contactTruthSnapshot();
     // The contacts are read a batch at a time, never all at once: with their pictures, a
@@ -71,8 +99,11 @@ bool ZTContactsSyncer::disassembleData() {
         card.clear();
         writer.appendCard(card, contact);
         // One byte-order mark opens the file; the cards follow each other without one.
-        if (written == 0) _allVCardData += "\xFE\xFF";
-        platform::utf16::appendBigEndian(_allVCardData, card);
+        if (written == 0) {
+          _vcardPending += "\xFE\xFF";
+          _vcardSize += 2;
+        }
+        appendToFile(card, Flush::WhenFull);
         ++written;
         if (session.isCancelled()) {
           Log::debug("Sync session is cancelled");
@@ -93,6 +124,7 @@ bool ZTContactsSyncer::disassembleData() {
       });
       if (!writeBatch()) return false;
     }
+    appendToFile({}, Flush::All);
     // The pictures of this push are all the photo cache keeps.
     if (photosUsed) ContactPhotoPreparation::shared().finishRun();
     Log::debug("Effectively stored %ul contacts on Zeto", written);

@@ -18,21 +18,16 @@ using platform::Log;
 bool ZTContactsSyncer::uploadChanges() {
   const std::optional<std::string>& folder = _syncManager.pathToZetoContactsFolder();
   const std::filesystem::path path = std::filesystem::path(folder.value_or("")) / kFileName;
-  Log::debug("Uploading changes to %@ (%ul bytes)", path.string(), _allVCardData.size());
+  Log::debug("Uploading changes to %@ (%ul bytes)", path.string(), _vcardSize);
 
   const platform::FolderHandle* contacts = _syncManager.zetoContactsFolder();
   const std::string fileName(kFileName);
-  const std::span<const std::uint8_t> bytes(
-      reinterpret_cast<const std::uint8_t*>(_allVCardData.data()), _allVCardData.size());
-  // A run that was killed, or a player pulled, between the write of the temporary file and
-  // its rename left a full-size hidden copy behind. The device lock keeps any other sync from
-  // writing meanwhile, so every such copy is stale; one that cannot be removed is no reason
-  // not to write.
-  if (contacts) (void)contacts->removeStaleTemporaries(fileName);
   // A power loss or a pulled cable leaves the player with the old file or the new one,
   // never half of one. The accepted changes stay uncommitted when the write fails, so the
-  // next run offers them again. Without a folder on the player there is nowhere to write.
-  if (!contacts || !contacts->atomicWrite(fileName, bytes)) {
+  // next run offers them again.
+  std::optional<platform::AtomicFile> file = std::move(_vcardFile);
+  _vcardFile.reset();
+  if (!contacts || !file || !file->commit()) {
     Log::debug("Unabled to write file on Zeto");
     _syncManager.setLastStatus(sync::kStatusWriteFailed);
     return false;

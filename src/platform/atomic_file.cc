@@ -134,7 +134,7 @@ Result<void> AtomicFile::commit(Durability durability) {
   if (fd_ < 0) return errorText("write", target(), EBADF);
   // Durable content first: otherwise a crash after the rename could leave an empty file
   // under the target's name.
-  if (durability == Durability::Synced && ::fsync(fd_) != 0) {
+  if (durability != Durability::Unsynced && ::fsync(fd_) != 0) {
     const int error = errno;
     discard();
     return errorText("write", target(), error);
@@ -153,7 +153,7 @@ Result<void> AtomicFile::commit(Durability durability) {
   }
   temporary_.clear();
 
-  if (durability == Durability::Unsynced) return {};
+  if (durability != Durability::Synced) return {};
   int error = ::fsync(folderFd_) == 0 ? 0 : errno;
   // Some file systems cannot fsync a folder at all; the rename is then as durable as they get.
   if (error == EINVAL || error == ENOTSUP) error = 0;

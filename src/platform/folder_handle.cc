@@ -173,6 +173,14 @@ Result<void> FolderHandle::atomicWrite(const std::string& name, std::span<const 
   return file->commit(durability);
 }
 
+Result<void> FolderHandle::sync() const {
+  int error = ::fsync(fd_) == 0 ? 0 : errno;
+  // Some file systems cannot fsync a folder at all; its renames are then as durable as they get.
+  if (error == EINVAL || error == ENOTSUP) error = 0;
+  if (error != 0) return errorText("flush", path_, error);
+  return {};
+}
+
 Result<std::vector<std::uint8_t>> FolderHandle::readFile(const std::string& name,
                                                          std::size_t largest) const {
   const std::filesystem::path filePath = path_ / name;

@@ -27,8 +27,10 @@ struct FileAttributes {
 enum class IfMissing { Create, Fail };
 
 // Whether a replaced file must survive a power loss (fsync of the file and its folder), or
-// may be lost to one, as an entry of a cache may.
-enum class Durability { Synced, Unsynced };
+// may be lost to one, as an entry of a cache may. FolderLater syncs the file before the
+// rename and leaves the folder to one FolderHandle::sync() after the last of several files:
+// until then a power loss may lose a rename, never leave half a file.
+enum class Durability { Synced, Unsynced, FolderLater };
 
 // One open folder, and every operation on the names in it made relative to its descriptor
 // (openat(2), mkdirat(2), renameat(2), unlinkat(2), statx(2) with AT_SYMLINK_NOFOLLOW).
@@ -65,6 +67,9 @@ class FolderHandle {
   // old file is untouched and no temporary file is left.
   Result<void> atomicWrite(const std::string& name, std::span<const std::uint8_t> bytes,
                            Durability durability = Durability::Synced) const;
+  // Makes the renames and removals done in the folder so far survive a power loss (fsync of
+  // the folder; a file system that cannot sync a folder counts as done).
+  Result<void> sync() const;
   // The content of the regular file `name`, never through a link; an error for anything else
   // and for a file larger than `largest` bytes.
   Result<std::vector<std::uint8_t>> readFile(const std::string& name, std::size_t largest) const;

@@ -19,6 +19,7 @@ namespace zt::platform {
 namespace {
 
 std::atomic<bool> debugFlag{false};
+thread_local std::uint64_t messagesAsked = 0;
 
 // ---------------------------------------------------------------------------------------------
 // Formatting
@@ -237,6 +238,14 @@ void Log::setDebugEnabled(bool enabled) {
 
 bool Log::debugEnabled() {
   return debugFlag.load(std::memory_order_relaxed);
+}
+
+void Log::countMessage() {
+  ++messagesAsked;
+}
+
+std::uint64_t Log::messageCount() {
+  return messagesAsked;
 }
 
 std::string Log::format(std::string_view format, std::span<const LogArgument> args) {

@@ -53,16 +53,19 @@ class Log {
 
   template <typename... Args>
   static void debug(std::string_view format, const Args&... args) {
+    countMessage();
     if (debugEnabled()) write(format, {LogArgument(args)...});
   }
   // Lines that are written whether or not debug logging is on.
   template <typename... Args>
   static void always(std::string_view format, const Args&... args) {
+    countMessage();
     write(format, {LogArgument(args)...});
   }
   // Written to the standard error stream, and to the log as an always-written line.
   template <typename... Args>
   static void standardError(std::string_view format, const Args&... args) {
+    countMessage();
     writeToStandardError(format, {LogArgument(args)...});
   }
 
@@ -71,10 +74,16 @@ class Log {
     return format(fmt, std::span<const LogArgument>(args.begin(), args.size()));
   }
 
+  // How many lines this thread has asked for so far, debug lines included whether or not
+  // they were written: a step that asked for none logs the same with debug logging on or
+  // off, so what it made may be reused without its lines.
+  static std::uint64_t messageCount();
+
   // Reads $ZETOSYNCTOOL_LOG again (it is read once, at the first line, otherwise).
   static void configureFromEnvironment();
 
  private:
+  static void countMessage();
   static void write(std::string_view format, std::initializer_list<LogArgument> args);
   static void writeToStandardError(std::string_view format,
                                    std::initializer_list<LogArgument> args);

@@ -1,5 +1,6 @@
 #include "sync/zt_sync_manager.h"
 
+#include <algorithm>
 #include <mutex>
 
 #include "filters/filter_classes.h"
@@ -108,7 +109,20 @@ bool ZTSyncManager::doCoreSync() {
       _contactSyncer = services_.syncers.contacts(*this);
       filters::ZetoContactFilter::setContactFilterHelper(_contactSyncer.get());
     }
-    _syncSession->prepareToPullChanges(_entitiesToSync);
+    // The calendars syncer reads the changes of the calendar order and the calendars only:
+    // every file is rebuilt from the snapshot, so the events and what hangs on them are
+    // read there. Preparing their changes too would only fill the session's change table
+    // with an add per record, every run, that nobody reads or accepts.
+    std::vector<std::string> prepared;
+    for (const std::string& entity : _entitiesToSync) {
+      if (entity == tessel::TesselEntity_Calendars_CalendarOrder ||
+          entity == tessel::TesselEntity_Calendars_Calendar ||
+          std::find(entitiesForCalendars().begin(), entitiesForCalendars().end(), entity) ==
+              entitiesForCalendars().end()) {
+        prepared.push_back(entity);
+      }
+    }
+    _syncSession->prepareToPullChanges(prepared);
     return true;
   } catch (const tessel::Exception& exception) {
     reportEngineException("preparing to pull changes from sync server", exception);

@@ -273,19 +273,12 @@ void Session::prepareToPullChanges(const std::vector<std::string>& entityNames) 
   const FilterList filters = storedFilters(connection, client);
   const std::vector<EntityRule> rules =
       entityRules(entities, state_->entityNamesToReplace, filters);
-  auto ruleOf = [&](std::string_view entity) -> const EntityRule& {
+  // None for an entity this preparation leaves out.
+  auto findRule = [&](std::string_view entity) -> const EntityRule* {
     for (const EntityRule& rule : rules) {
-      if (rule.name == entity) return rule;
+      if (rule.name == entity) return &rule;
     }
-    return rules.front();  // not reached: the queries select these entities only
-  };
-
-  std::string inList = placeholders(entities.size(), 2);
-  auto bindEntities = [&](Statement& statement) {
-    statement.bind(1, client);
-    for (std::size_t i = 0; i < entities.size(); ++i) {
-      statement.bind(static_cast<int>(i) + 2, entities[i]);
-    }
+    return nullptr;
   };
   clearUncommittedChanges(connection, entities);
   Statement insert(connection,
@@ -302,50 +295,89 @@ void Session::prepareToPullChanges(const std::vector<std::string>& entityNames) 
     insert.run();
   };
 
-  // One pass over truth joined with the mirror, in the order truth changed. Records are
-  // decoded only when a filter must judge them. The unary + keeps SQLite walking the
-  // generation index instead of sorting every record (blobs included) by generation.
+  // One pass over truth and the mirror side by side, both in identifier order, so that no
+  // record costs a search of the other side. The pass never names the data column: SQLite
+  // builds a result row whole, so naming it would read every record, pictures included. What
+  // may change, and every record a filter must judge, is then taken in the order truth
+  // changed; a record is read and decoded only when a filter judges it. Records the client
+  // holds that truth never had (or lost without a tombstone) come last, in identifier order.
+  struct Candidate {
+    std::int64_t generation;
+    std::int64_t key;
+    std::string id;
+    const EntityRule* rule;
+    TruthState state;
+    std::optional<std::int64_t> held;
+  };
+  struct Orphan {
+    std::string id;
+    const EntityRule* rule;
+    std::int64_t generation;
+  };
+  std::vector<Candidate> candidates;
+  std::vector<Orphan> orphans;
   {
     Statement truth(connection,
-                    "SELECT r.key, r.id, r.entity, r.generation, r.deleted, r.data, m.generation "
-                    "FROM main.records r LEFT JOIN main.mirror m "
-                    "ON m.client_id = ?1 AND m.record_id = r.id "
-                    "WHERE +r.entity IN (" +
-                        inList + ") ORDER BY r.generation");
-    bindEntities(truth);
-    while (truth.step()) {
-      std::string_view id = truth.text(1);
-      std::string_view entity = truth.text(2);
-      std::int64_t generation = truth.integer(3);
-      const TruthState state = truth.integer(4) != 0 ? TruthState::Gone : TruthState::Live;
-      std::optional<std::int64_t> held;
-      if (!truth.isNull(6)) held = truth.integer(6);
-      const EntityRule& rule = ruleOf(entity);
-      FilterVerdict verdict = FilterVerdict::Passes;
-      if (state == TruthState::Live && !rule.judges.empty()) {
-        verdict = judge(rule.judges, detail::decodeRecord(truth.blob(5)), std::string(id));
+                    "SELECT key, id, entity, generation, deleted FROM main.records ORDER BY id");
+    Statement mirror(connection,
+                     "SELECT record_id, generation, entity FROM main.mirror WHERE client_id = ?1 "
+                     "ORDER BY record_id");
+    mirror.bind(1, client);
+    bool mirrorRow = mirror.step();
+    // Passes the mirror's records before `id` (none when at the end): truth has none of them.
+    auto passMirrorBefore = [&](const std::string_view* id) {
+      while (mirrorRow && (!id || mirror.text(0) < *id)) {
+        if (const EntityRule* rule = findRule(mirror.text(2))) {
+          orphans.push_back({std::string(mirror.text(0)), rule, mirror.integer(1)});
+        }
+        mirrorRow = mirror.step();
       }
-      add(id, truth.integer(0), entity, decidePull(state, generation, held, verdict, rule.mode),
-          generation);
+    };
+    while (truth.step()) {
+      const std::string_view id = truth.text(1);
+      passMirrorBefore(&id);
+      std::optional<std::int64_t> held;
+      if (mirrorRow && mirror.text(0) == id) {
+        held = mirror.integer(1);
+        mirrorRow = mirror.step();
+      }
+      const EntityRule* rule = findRule(truth.text(2));
+      if (!rule) continue;
+      const std::int64_t generation = truth.integer(3);
+      const TruthState state = truth.integer(4) != 0 ? TruthState::Gone : TruthState::Live;
+      const bool judged = state == TruthState::Live && !rule->judges.empty();
+      if (!judged && decidePull(state, generation, held, FilterVerdict::Passes, rule->mode) ==
+                         PullAction::Nothing) {
+        continue;
+      }
+      candidates.push_back({generation, truth.integer(0), std::string(id), rule, state, held});
+    }
+    passMirrorBefore(nullptr);
+  }
+  std::sort(candidates.begin(), candidates.end(),
+            [](const Candidate& a, const Candidate& b) { return a.generation < b.generation; });
+  {
+    Statement data(connection, "SELECT data FROM main.records WHERE key = ?");
+    for (const Candidate& candidate : candidates) {
+      const EntityRule& rule = *candidate.rule;
+      FilterVerdict verdict = FilterVerdict::Passes;
+      if (candidate.state == TruthState::Live && !rule.judges.empty()) {
+        StatementReset reset(data);
+        data.bind(1, candidate.key);
+        if (data.step()) {
+          verdict = judge(rule.judges, detail::decodeRecord(data.blob(0)), candidate.id);
+        }
+      }
+      add(candidate.id, candidate.key, rule.name,
+          decidePull(candidate.state, candidate.generation, candidate.held, verdict, rule.mode),
+          candidate.generation);
     }
   }
-  // Records the client holds that truth never had (or lost without a tombstone).
-  {
-    Statement orphans(connection,
-                      "SELECT m.record_id, m.entity, m.generation FROM main.mirror m "
-                      "WHERE m.client_id = ?1 AND m.entity IN (" +
-                          inList +
-                          ") AND NOT EXISTS (SELECT 1 FROM main.records r "
-                          "WHERE r.id = m.record_id) ORDER BY m.record_id");
-    bindEntities(orphans);
-    while (orphans.step()) {
-      std::string_view entity = orphans.text(1);
-      const std::int64_t generation = orphans.integer(2);
-      add(orphans.text(0), 0, entity,
-          decidePull(TruthState::Gone, generation, generation, FilterVerdict::Passes,
-                     ruleOf(entity).mode),
-          generation);
-    }
+  for (const Orphan& orphan : orphans) {
+    add(orphan.id, 0, orphan.rule->name,
+        decidePull(TruthState::Gone, orphan.generation, orphan.generation, FilterVerdict::Passes,
+                   orphan.rule->mode),
+        orphan.generation);
   }
 }
 

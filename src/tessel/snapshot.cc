@@ -49,6 +49,32 @@ std::vector<std::string> Snapshot::recordIdentifiersOfEntity(std::string_view en
   return identifiers;
 }
 
+RecordsVersion Snapshot::versionOfEntities(const std::vector<std::string>& entities) const {
+  RecordsVersion version;
+  std::vector<std::string_view> seen;
+  for (const std::string& entity : entities) {
+    if (sees(entity)) seen.push_back(entity);
+  }
+  if (seen.empty()) return version;
+  std::string inList = "?";
+  for (std::size_t i = 1; i < seen.size(); ++i) inList += ", ?";
+  // The entity index answers the count alone. The generation index, walked from the top,
+  // reaches the latest of these records after the other records written since, which are
+  // the few written after it.
+  detail::Statement& count =
+      view_->connection().cached("SELECT count(*) FROM records WHERE entity IN (" + inList + ")");
+  detail::Statement& latest =
+      view_->connection().cached("SELECT generation FROM records WHERE +entity IN (" + inList +
+                                 ") ORDER BY generation DESC LIMIT 1");
+  for (detail::Statement* query : {&count, &latest}) {
+    detail::StatementReset reset(*query);
+    for (std::size_t i = 0; i < seen.size(); ++i) query->bind(static_cast<int>(i) + 1, seen[i]);
+    if (!query->step()) continue;
+    (query == &count ? version.records : version.latestGeneration) = query->integer(0);
+  }
+  return version;
+}
+
 void Snapshot::forEachRecordMatching(const zt::platform::Dictionary& criteria,
                                      const std::function<void(Record&)>& visit,
                                      const std::vector<std::string>& omitted) const {

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <cstdint>
 #include <functional>
 #include <memory>
 #include <optional>
@@ -16,6 +17,17 @@ namespace tessel {
 namespace detail {
 class ReadView;
 }
+
+// Where the records of some entities stand in a snapshot: the latest generation among them
+// (tombstones included) and how many there are. Every write of such a record takes a new,
+// higher generation, and a record that leaves them lowers the count, so two snapshots of one
+// store whose versions are equal hold the same records of those entities.
+struct RecordsVersion {
+  std::int64_t latestGeneration = 0;
+  std::int64_t records = 0;
+
+  bool operator==(const RecordsVersion&) const = default;
+};
 
 // A read-only, consistent view of truth for some entities: it does not see writes made after
 // it was taken. Records of entities outside the view are not found. A snapshot keeps its
@@ -36,6 +48,8 @@ class Snapshot {
   // The identifiers of the view's records of `entity`, in identifier order, read without
   // decoding any record: a count, or the work list of a caller that reads them in batches.
   std::vector<std::string> recordIdentifiersOfEntity(std::string_view entity) const;
+  // The version of the records of those entities that the view sees; no record is read.
+  RecordsVersion versionOfEntities(const std::vector<std::string>& entities) const;
   // The records recordsMatchingAttributes(criteria) answers, in the same identifier order, but
   // handed to `visit` one at a time: only the record being visited is decoded and held. The
   // attributes named in `omitted` (an image, say) are left out of the visited records; read

@@ -4,7 +4,10 @@
 #include <gtest/gtest.h>
 
 #include <fstream>
+#include <functional>
 #include <string>
+#include <tuple>
+#include <utility>
 #include <vector>
 
 #include "support/files.h"
@@ -156,6 +159,82 @@ TEST_F(CalendarsSync, TheFilterSelectsCalendarsAndTheUsersOrderIsKept) {
   EXPECT_TRUE(contains(calendarFile("Tessel-Charlie.ics"), "X-WR-CALORDER:1l\r\n"));
   EXPECT_TRUE(contains(calendarFile("Tessel-Alpha.ics"), "X-WR-CALORDER:2l\r\n"));
   EXPECT_TRUE(run.logContains("Filtered calendar IDs are:\n(cal-c, cal-a)")) << run.log;
+}
+
+// Every run writes every calendar. One whose records have not changed is written from the text
+// an earlier run kept: the same bytes, and the same log lines as an export. Nothing the text
+// depends on can change without the next run exporting it again.
+TEST_F(CalendarsSync, KeptTextsAreReusedOnlyWhileNothingTheyDependOnChanged) {
+  // Contacts too, so that the session sees records of both classes.
+  tessel({"client", "register", std::string(kClientID), "--contacts", "--calendars"});
+  Json walk = event("ev-2", "Walk", "2007-03-16T09:00:00");
+  walk["record"]["attendees"] = Json::array({"who"});
+  const auto attendee = [](const std::string& entity, const std::string& email) {
+    return record("who", Json{{"tessel.record.entity", entity}, {"email", email}});
+  };
+  putRecords({calendar("cal-home", "Home", {"ev-1", "ev-2"}),
+              event("ev-1", "Lunch", "2007-03-15T12:30:00"), walk,
+              attendee("tessel.calendars.Attendee", "ann@example.com")});
+  const fs::path kept = folder() / ".cache/zetosynctool/calendars";
+  const auto sync = [&] {
+    const SynctoolRun run = syncClient(kClientID);
+    EXPECT_EQ(run.finalStatus(), 0) << run.log;
+    return std::pair{run.log, calendarFile("Tessel-Home.ics")};
+  };
+  sync();
+  ASSERT_EQ(zt::test_support::namesIn(kept).size(), 1u);
+  const auto fromKept = sync();
+  fs::remove_all(kept);
+  EXPECT_EQ(fromKept, sync());
+  EXPECT_TRUE(contains(fromKept.second, "SUMMARY:Lunch\r\n")) << fromKept.second;
+
+  // Each change, then what the next file must (and must no longer) say.
+  const std::vector<std::tuple<const char*, std::function<void()>, std::string, std::string>>
+      changes = {
+          {"an event changed",
+           [&] {
+             Json dinner = event("ev-1", "Dinner", "2007-03-15T19:00:00");
+             dinner["record"]["attendees"] = Json::array({"ghost"});
+             putRecords({dinner});
+           },
+           "SUMMARY:Dinner", "Lunch"},
+          {"an attendee deleted",
+           [&] {
+             tessel({"records", "delete", "who"});
+           },
+           "SUMMARY:Walk", "ann@example.com"},
+          // Named but missing since the event changed, then a record of another class under
+          // that name: the text depended on more than the calendar's records.
+          {"a missing record put as a contact group",
+           [&] {
+             Json ghost = attendee("tessel.contacts.Group", "bob@example.com");
+             ghost["id"] = "ghost";
+             putRecords({ghost});
+           },
+           "bob@example.com", "Lunch"},
+      };
+  for (const auto& [name, change, now, gone] : changes) {
+    SCOPED_TRACE(name);
+    change();
+    const std::string text = sync().second;
+    EXPECT_TRUE(contains(text, now)) << text;
+    EXPECT_FALSE(contains(text, gone)) << text;
+  }
+
+  // Another store put where the store was, with the same number of writes: the same version
+  // of its calendar records, other records.
+  const fs::path other = folder() / "other.db";
+  setEnvironment("TESSEL_STORE", other.string());
+  for (const char* summary : {"Before", "After"}) {
+    SCOPED_TRACE(summary);
+    for (const char* suffix : {"", "-wal", "-shm"}) fs::remove(other.string() + suffix);
+    tessel({"init"});
+    tessel({"client", "register", std::string(kClientID), "--calendars"});
+    putRecords(
+        {calendar("cal-home", "Home", {"ev-1"}), event("ev-1", summary, "2007-03-15T12:30:00")});
+    const std::string text = sync().second;
+    EXPECT_TRUE(contains(text, std::string("SUMMARY:") + summary)) << text;
+  }
 }
 
 // Failures end the run with status 2 and say why; the calendars syncer still closes with 100

@@ -235,10 +235,11 @@ SynctoolRun SynctoolTest::runSynctool(const std::vector<std::string>& arguments,
 }
 
 zt::test_support::ProcessRun SynctoolTest::runTessel(const std::vector<std::string>& arguments) {
-  std::vector<std::string> words = {TESSEL_BINARY, "--store", (folder() / "truth.db").string()};
-  words.insert(words.end(), arguments.begin(), arguments.end());
   zt::test_support::ProcessOptions options;
   options.environment = environment();
+  std::vector<std::string> words = {TESSEL_BINARY, "--store",
+                                    options.environment->at("TESSEL_STORE")};
+  words.insert(words.end(), arguments.begin(), arguments.end());
   options.mergeErrorIntoOutput = true;
   return zt::test_support::runProcess(words, options);
 }

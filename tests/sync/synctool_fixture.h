@@ -136,8 +136,8 @@ class SynctoolTest : public ::testing::Test {
     return runSynctool({"--oneshot", "--sync", std::string(clientID)}, watch);
   }
 
-  // `tessel --store <the test's store> arguments...` with the binary's environment, as the
-  // desktop application would run it; standard error goes with the output.
+  // `tessel --store <the test's store, or $TESSEL_STORE when set> arguments...` with the binary's
+  // environment, as the desktop application would run it; standard error goes with the output.
   zt::test_support::ProcessRun runTessel(const std::vector<std::string>& arguments);
   // The same, and the test fails when it does.
   void tessel(const std::vector<std::string>& arguments);
