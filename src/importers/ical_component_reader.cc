@@ -5,6 +5,7 @@
 #include <utility>
 
 #include "importers/ical_properties.h"
+#include "importers/import_warning.h"
 #include "platform/calendar_day.h"
 
 namespace tessel::importers::ical {
@@ -14,6 +15,12 @@ using zt::platform::TimeZone;
 
 ImportError ComponentReader::error(icalproperty* property, std::string reason) const {
   return document_.errorAt(property, component_, std::move(reason));
+}
+
+void ComponentReader::warn(icalproperty* property, std::string_view text) const {
+  std::optional<std::size_t> line = ICalDocument::lineOf(property);
+  if (!line) line = ICalDocument::lineOf(component_);
+  importWarning(document_.source(), line, text);
 }
 
 std::string ComponentReader::name(icalproperty* property) const {

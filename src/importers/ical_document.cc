@@ -240,6 +240,10 @@ std::optional<std::size_t> ICalDocument::lineOf(icalcomponent* component) {
   return std::nullopt;
 }
 
+bool ICalDocument::isLineMark(std::string_view name) {
+  return name == kLineName;
+}
+
 ImportError ICalDocument::errorAt(icalproperty* property, icalcomponent* component,
                                   std::string reason) const {
   std::optional<std::size_t> line = lineOf(property);

@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "support/files.h"
+#include "support/scoped_environment.h"
 #include "tessel/record_json.h"
 #include "tessel/schema.h"
 #include "tessel/test_store.h"
@@ -68,26 +69,75 @@ TEST(ICalImportReading, EachExportBecomesTheRecordsOfItsReferenceFile) {
   }
 }
 
-TEST(ICalImportReading, TitlesAndIdentifiers) {
-  const std::string named = calendarText(
-      "X-WR-CALNAME:Named\r\nBEGIN:VEVENT\r\nSUMMARY:No uid\r\n"
-      "DTSTART:20260101T100000Z\r\nEND:VEVENT\r\n");
-  EXPECT_EQ(readText(named).title, "Named");
-  EXPECT_EQ(readText(calendarText("")).title, "fallback");
-
-  // Without a UID, what the event says makes its identifier: the same while it stays so.
-  const ICalCalendar first = readText(named);
-  const ICalCalendar again = readText(named);
-  ASSERT_EQ(first.records.size(), 2u);
-  EXPECT_EQ(first.records[1].id, again.records[1].id);
-  EXPECT_EQ(first.records[1].id.rfind("cal/event/no-uid-", 0), 0u);
-
-  // The same UID twice (say, in two files of a folder) is one event: the later one.
-  const ICalCalendar twice =
-      readText(calendarText("BEGIN:VEVENT\r\nUID:a\r\nSUMMARY:old\r\nEND:VEVENT\r\n"
-                            "BEGIN:VEVENT\r\nUID:a\r\nSUMMARY:new\r\nEND:VEVENT\r\n"));
-  EXPECT_EQ(twice.eventCount, 1u);
-  EXPECT_CONTAINS(json(twice, "cal/event/a"), R"("summary":"new")");
+// What a component says and what becomes of it, with the warnings said on the way: each
+// case's calendar body, a record that must hold a text (or be absent), and the warnings.
+TEST(ICalImportReading, NothingIsLostInSilence) {
+  zt::test_support::ScopedEnvironment environment;
+  environment.set("TZ", "Europe/Paris");
+  const std::string noUid = "BEGIN:VEVENT\r\nSUMMARY:Tea\r\nDTSTART:20260101T100000Z\r\n";
+  const std::string alarm = "BEGIN:VEVENT\r\nUID:e\r\n";
+  const struct {
+    std::string body, id, holds, warnings;
+    std::size_t events = 1;
+  } cases[] = {
+      // A fixed-time alarm becomes its offset from the start: of a UTC time, of a time in a
+      // zone, and of a whole day, which starts at local midnight (here 23:00 UTC the day
+      // before). One without zone is read on the start's wall clock.
+      {alarm + "DTSTART:20260301T100000Z\r\nBEGIN:VALARM\r\nACTION:DISPLAY\r\n"
+               "TRIGGER;VALUE=DATE-TIME:20260301T091500Z\r\nEND:VALARM\r\nEND:VEVENT\r\n",
+       "cal/event/e#alarm1", R"("trigger duration":-2700})", ""},
+      {alarm + "DTSTART;TZID=America/New_York:20260301T100000\r\nBEGIN:VALARM\r\n"
+               "ACTION:AUDIO\r\nTRIGGER;VALUE=DATE-TIME:20260301T140000Z\r\nEND:VALARM\r\n"
+               "END:VEVENT\r\n",
+       "cal/event/e#alarm1", R"("trigger duration":-3600})", ""},
+      {alarm + "DTSTART;TZID=America/New_York:20260301T100000\r\nBEGIN:VALARM\r\n"
+               "ACTION:AUDIO\r\nTRIGGER;VALUE=DATE-TIME:20260301T093000\r\nEND:VALARM\r\n"
+               "END:VEVENT\r\n",
+       "cal/event/e#alarm1", R"("trigger duration":-1800})", ""},
+      {alarm + "DTSTART;VALUE=DATE:20260301\r\nBEGIN:VALARM\r\nACTION:DISPLAY\r\n"
+               "TRIGGER;VALUE=DATE-TIME:20260228T170000Z\r\nEND:VALARM\r\nEND:VEVENT\r\n",
+       "cal/event/e#alarm1", R"("trigger duration":-21600})", ""},
+      // An alarm without ACTION reminds on screen; ACTION:NONE never alerts.
+      {alarm + "DTSTART:20260301T100000Z\r\nBEGIN:VALARM\r\nTRIGGER:-PT5M\r\nEND:VALARM\r\n"
+               "BEGIN:VALARM\r\nACTION:NONE\r\nTRIGGER:-PT1M\r\nEND:VALARM\r\nEND:VEVENT\r\n",
+       "cal/event/e", R"("display alarms":["cal/event/e#alarm1"],)",
+       "test.ics:7: VALARM without ACTION: read as a display alarm\n"},
+      {alarm + "BEGIN:VALARM\r\nACTION:PROCEDURE\r\nTRIGGER:-PT5M\r\nEND:VALARM\r\n"
+               "BEGIN:VALARM\r\nACTION:DISPLAY\r\nEND:VALARM\r\nEND:VEVENT\r\n",
+       "cal/event/e#alarm1", "(absent",
+       "test.ics:7: VALARM: ACTION:PROCEDURE is not an alarm: dropped\n"
+       "test.ics:10: VALARM without TRIGGER: dropped\n"},
+      // Of two DTSTART lines the first counts.
+      {alarm + "DTSTART:20260301T100000Z\r\nDTSTART:20260302T100000Z\r\nEND:VEVENT\r\n",
+       "cal/event/e", R"("start date":{"$date":"2026-03-01T10:00:00")",
+       "test.ics:7: a second DTSTART: ignored\n"},
+      // Without UID, what the event says is its identity: two that differ stay two.
+      {noUid + "END:VEVENT\r\n" + noUid + "DESCRIPTION:Green\r\nEND:VEVENT\r\n", "cal",
+       R"("events":["cal/event/no-uid-)", "", 2},
+      // A UID given twice: both kept, the later as a copy; the same event twice is one.
+      {"BEGIN:VEVENT\r\nUID:a\r\nSUMMARY:old\r\nEND:VEVENT\r\n"
+       "BEGIN:VEVENT\r\nUID:a\r\nSUMMARY:new\r\nEND:VEVENT\r\n"
+       "BEGIN:VEVENT\r\nUID:a\r\nSUMMARY:new\r\nDTSTAMP:20260101T000000Z\r\nEND:VEVENT\r\n",
+       "cal", R"("events":["cal/event/a","cal/event/a/copy-)",
+       "test.ics:9: UID a is given twice: kept as a second event\n", 2},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.body);
+    ::testing::internal::CaptureStderr();
+    const ICalCalendar calendar = readText(calendarText(c.body));
+    std::string warnings = ::testing::internal::GetCapturedStderr();
+    for (std::size_t at; (at = warnings.find("tessel: warning: ")) != std::string::npos;)
+      warnings.erase(at, 17);
+    EXPECT_CONTAINS(json(calendar, c.id), c.holds);
+    EXPECT_EQ(warnings, c.warnings);
+    EXPECT_EQ(calendar.eventCount, c.events);
+  }
+  const std::string twoTeas =
+      calendarText(noUid + "END:VEVENT\r\n" + noUid + "DESCRIPTION:Green\r\nEND:VEVENT\r\n");
+  // Read again, the same file gives the same identifiers.
+  EXPECT_EQ(readText(twoTeas).records[2].id, readText(twoTeas).records[2].id);
+  EXPECT_EQ(readText(twoTeas).title, "fallback");
+  EXPECT_EQ(readText(calendarText("X-WR-CALNAME:Named\r\n")).title, "Named");
 }
 
 // Every file of malformed/ is refused with its line and reason, compared with
