@@ -6,10 +6,12 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <fstream>
 #include <string>
 #include <vector>
 
+#include "importers/stable_hash.h"
 #include "support/files.h"
 #include "support/scoped_environment.h"
 #include "tessel/record_json.h"
@@ -20,6 +22,10 @@ namespace tessel::importers {
 namespace {
 
 namespace fs = std::filesystem;
+
+using zt::platform::Array;
+using zt::platform::Dictionary;
+using zt::platform::Value;
 
 const fs::path kData = fs::path(ZT_TEST_DATA_DIR) / "data" / "ical";
 
@@ -146,7 +152,7 @@ TEST(ICalImportReading, MalformedInputNamesFileAndLine) {
   std::string faults;
   for (const std::string& name : zt::test_support::namesIn(kData / "malformed")) {
     try {
-      readICalendarPaths({kData / "outlook.ics", kData / "malformed" / name}, std::nullopt);
+      readICalendarPaths({kData / "outlook.ics", kData / "malformed" / name});
       faults += name + ": accepted\n";
     } catch (const ImportError& e) {
       EXPECT_EQ(e.source(), (kData / "malformed" / name).string());
@@ -161,13 +167,37 @@ class ICalImportStore : public testing::StoreTest {
  protected:
   fs::path write(const std::string& name, const std::string& text) {
     const fs::path path = folder_ / name;
+    fs::create_directories(path.parent_path());
     std::ofstream(path, std::ios::binary) << text;
     return path;
   }
 
   ICalImportCounts import(const std::vector<fs::path>& paths,
-                          SyncDeletes syncDeletes = SyncDeletes::Off) {
-    return writeICalCalendars(*store_, readICalendarPaths(paths, std::nullopt), syncDeletes);
+                          SyncDeletes syncDeletes = SyncDeletes::Off,
+                          const ICalImportTarget& target = {}) {
+    return writeICalCalendars(*store_, readICalendarPaths(paths, target, knownCalendars(*store_)),
+                              syncDeletes);
+  }
+
+  // The identifier of the first calendar of that title.
+  std::string calendarTitled(const std::string& title) const {
+    for (const KnownCalendar& calendar : knownCalendars(*store_))
+      if (calendar.title == title) return calendar.identifier;
+    return "(no calendar " + title + ")";
+  }
+
+  // "Title: N events; " of each calendar, by title.
+  std::string calendars() const {
+    std::vector<std::string> lines;
+    for (const KnownCalendar& calendar : knownCalendars(*store_)) {
+      const auto events = zt::platform::stringsIn(
+          store_->record(calendar.identifier)->find(TesselRelationship_Calendars_Calendar_Events));
+      lines.push_back(calendar.title + ": " + std::to_string(events.size()) + " events; ");
+    }
+    std::sort(lines.begin(), lines.end());
+    std::string text;
+    for (const std::string& line : lines) text += line;
+    return text;
   }
 
   std::vector<std::string> ids() const {
@@ -197,40 +227,124 @@ const std::string kOneEvent = calendarText(
     "BEGIN:VEVENT\r\nUID:stays\r\nSUMMARY:Stays, renamed\r\nDTSTART:20260101T100000Z\r\n"
     "END:VEVENT\r\n");
 
+std::string namedCalendar(const std::string& labels, const std::string& uid) {
+  return calendarText(labels + "BEGIN:VEVENT\r\nUID:" + uid + "\r\nEND:VEVENT\r\n");
+}
+
+// Imports one after the other, and the calendars they leave: a calendar is found again by
+// its writer's X-WR-RELCALID, else by its title, wherever its file is now.
+TEST_F(ICalImportStore, CalendarsAreFoundAgainByRelationIdElseByTitle) {
+  struct Step {
+    std::string file, labels, title = "", calendar = "";
+  };
+  const std::string work = "X-WR-CALNAME:Work\r\n";
+  const struct {
+    std::vector<Step> steps;
+    std::string calendars;
+  } cases[] = {
+      // Downloaded again, or moved: the same calendar.
+      {{{"work.ics", work}, {"work (1).ics", work}, {"moved/work.ics", work}}, "Work: 3 events; "},
+      // The writer's identifier holds through a new title; another writer's calendar of the
+      // same title is another calendar.
+      {{{"a.ics", "X-WR-RELCALID:r1\r\n" + work},
+        {"b.ics", "X-WR-RELCALID:r1\r\nX-WR-CALNAME:Job\r\n"},
+        {"c.ics", "X-WR-RELCALID:r2\r\n" + work},
+        {"d.ics", work}},
+       "Job: 2 events; Work: 2 events; "},
+      // --title wins over X-WR-CALNAME and finds the calendar it names; --calendar names the
+      // calendar outright, and keeps its title.
+      {{{"a.ics", work, "Mine"},
+        {"b.ics", "", "Mine"},
+        {"c.ics", work, "", "Mine"},
+        {"d.ics", work}},
+       "Mine: 3 events; Work: 1 events; "},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.calendars);
+    store_->deleteRecords(ids());
+    int uid = 0;
+    for (const Step& step : c.steps) {
+      ICalImportTarget target;
+      if (!step.title.empty()) target.title = step.title;
+      if (!step.calendar.empty()) target.calendar = calendarTitled(step.calendar);
+      import({write(step.file, namedCalendar(step.labels, std::to_string(++uid)))},
+             SyncDeletes::Off, target);
+    }
+    EXPECT_EQ(calendars(), c.calendars);
+  }
+
+  // Calendars of earlier versions were known by the path of their file ("ical-" and its
+  // hash): one is found by its title, else by that path; of two of a title, none is chosen.
+  store_->deleteRecords(ids());
+  Record earlier{"ical-earlier",
+                 {{TesselRecordEntityNameKey, TesselEntity_Calendars_Calendar},
+                  {TesselAttribute_Calendars_Calendar_Title, "Work"}}};
+  const fs::path copy = write("plans (1).ics", namedCalendar("", "p"));
+  Record byPath{"ical-" + stableHash(fs::canonical(copy).string()), earlier.record};
+  byPath.record.set(TesselAttribute_Calendars_Calendar_Title, "plans (1)");
+  store_->putRecords({earlier, byPath});
+  import({write("work.ics", namedCalendar(work, "x")), copy});
+  EXPECT_EQ(calendarTitled("Work"), "ical-earlier");
+  EXPECT_EQ(calendarTitled("plans"), byPath.id);
+  EXPECT_EQ(calendars(), "Work: 1 events; plans: 1 events; ");
+  earlier.id = "ical-other";
+  store_->putRecords({earlier});
+  EXPECT_THROW(
+      {
+        try {
+          import({folder_ / "work.ics"});
+        } catch (const ImportError& e) {
+          EXPECT_EQ(e.reason(),
+                    "2 calendars of the store are titled \"Work\" (ical-earlier, ical-other): "
+                    "name one with --calendar");
+          throw;
+        }
+      },
+      ImportError);
+}
+
 TEST_F(ICalImportStore, WhatLeftTheSourceStaysUnlessSyncDeletes) {
+  import({write("other.ics", namedCalendar("", "elsewhere"))});
   const fs::path file = write("work.ics", kTwoEvents);
-  const std::string calendar = calendarIdentifierForPath(file);
   import({file});
+  const std::string calendar = calendarTitled("work");
+  const std::string other = calendarTitled("other");
+  // An event that came otherwise into the calendar is not the import's to delete.
+  Record byHand{"by-hand", {{TesselRecordEntityNameKey, TesselEntity_Calendars_Event}}};
+  Dictionary listing = *store_->record(calendar);
+  Array events = *listing.arrayAt(TesselRelationship_Calendars_Calendar_Events);
+  events.emplace_back("by-hand");
+  listing.set(TesselRelationship_Calendars_Calendar_Events, Value(events));
+  store_->putRecords({byHand, {calendar, listing}});
   write("work.ics", kOneEvent);
 
   // Without --sync-deletes the event that left stays in its calendar, with its attendee;
   // the alarm that the remaining event no longer has goes.
   EXPECT_EQ(import({file}).deleted, 1u);
   EXPECT_EQ(stored(calendar + "/event/stays#alarm1"), "(absent)");
-  EXPECT_CONTAINS(stored(calendar), R"("events":[")" + calendar + R"(/event/stays",")" + calendar +
-                                        R"(/event/goes"])");
+  EXPECT_CONTAINS(stored(calendar), R"("events":[")" + calendar + R"(/event/stays","by-hand",")" +
+                                        calendar + R"(/event/goes"])");
   EXPECT_NE(stored(calendar + "/event/goes#attendee1"), "(absent)");
 
-  // With it, everything the source no longer produces goes.
+  // With it, everything the source no longer produces goes, from this calendar only.
   EXPECT_EQ(import({file}, SyncDeletes::On).deleted, 2u);
-  EXPECT_EQ(ids(), (std::vector<std::string>{calendar, calendar + "/event/stays",
-                                             "tessel.calendars.order"}));
-  EXPECT_CONTAINS(stored(calendar), R"("events":[")" + calendar + R"(/event/stays"])");
+  EXPECT_EQ(ids(), (std::vector<std::string>{"by-hand", other, other + "/event/elsewhere", calendar,
+                                             calendar + "/event/stays", "tessel.calendars.order"}));
+  EXPECT_CONTAINS(stored(calendar), R"("events":[")" + calendar + R"(/event/stays","by-hand"])");
 }
 
 TEST_F(ICalImportStore, CalendarOrderAppendsNewCalendarsAndDropsDeletedOnes) {
   const fs::path a = write("a.ics", calendarText(""));
   const fs::path b = write("b.ics", calendarText(""));
   const fs::path c = write("c.ics", calendarText(""));
-  const std::string idA = calendarIdentifierForPath(a), idB = calendarIdentifierForPath(b),
-                    idC = calendarIdentifierForPath(c);
   import({b, a});
+  const std::string idA = calendarTitled("a"), idB = calendarTitled("b");
   EXPECT_EQ(order(), (std::vector<std::string>{idB, idA}));
   import({a});
   EXPECT_EQ(order(), (std::vector<std::string>{idB, idA}));
   store_->deleteRecords({idB});
   import({c});
-  EXPECT_EQ(order(), (std::vector<std::string>{idA, idC}));
+  EXPECT_EQ(order(), (std::vector<std::string>{idA, calendarTitled("c")}));
 }
 
 }  // namespace

@@ -75,7 +75,7 @@ void addImportCommands(CLI::App& app, CommandLine& line) {
     std::vector<std::string> vcardPaths;
     bool vcardSyncDeletes = false;
     std::vector<std::string> icalPaths;
-    std::optional<std::string> icalTitle;
+    ICalImportChoices ical;
     bool icalSyncDeletes = false;
   };
   auto options = std::make_shared<Options>();
@@ -100,16 +100,23 @@ void addImportCommands(CLI::App& app, CommandLine& line) {
 
   auto* ical = import->add_subcommand(
       "ical",
-      "iCalendar files and folders of .ics files (vdir), one calendar per file or folder. "
-      "Nothing is imported unless every file is valid");
+      "iCalendar files and folders of .ics files (vdir), one calendar per file or folder. A "
+      "calendar imported before is found again by its X-WR-RELCALID, else by its title, also "
+      "when the file was moved or downloaded again under another name. Nothing is imported "
+      "unless every file is valid");
   ical->add_option("PATH", options->icalPaths, ".ics files or folders")->required();
-  ical->add_option("--title", options->icalTitle,
-                   "Title of calendars whose source names none (default: the file name)");
+  ical->add_option("--title", options->ical.title,
+                   "Title of the calendars, over the one their files give (default: "
+                   "X-WR-CALNAME, else the file or folder name)");
+  ical->add_option("--calendar", options->ical.calendar,
+                   "Import into this calendar of the store (its title, a unique start of it, or "
+                   "its identifier)");
   ical->add_flag("--sync-deletes", options->icalSyncDeletes,
-                 "Also delete the records of these calendars that this import does not produce");
+                 "Also delete the events and tasks of these calendars that this import does not "
+                 "produce");
   ical->callback([&line, options] {
     line.command = [options](CommandContext& context) {
-      importICalendars(context, options->icalPaths, options->icalTitle,
+      importICalendars(context, options->icalPaths, options->ical,
                        options->icalSyncDeletes ? SyncDeletes::On : SyncDeletes::Off);
     };
   });
