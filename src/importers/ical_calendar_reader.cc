@@ -80,7 +80,7 @@ std::string escapedUid(std::string_view uid) {
 // and sub-component as written, but for DTSTAMP, which many writers set to the time of the
 // export, and the line marks of the reader.
 void appendContent(icalcomponent* component, std::string& out) {
-  out += icalcomponent_kind_to_string(icalcomponent_isa(component));
+  if (const char* kind = icalcomponent_kind_to_string(icalcomponent_isa(component))) out += kind;
   out += '\n';
   for (icalproperty* property : propertiesOf(component)) {
     const char* name = icalproperty_get_property_name(property);

@@ -138,12 +138,15 @@ TEST(ICalImportReading, NothingIsLostInSilence) {
     EXPECT_EQ(warnings, c.warnings);
     EXPECT_EQ(calendar.eventCount, c.events);
   }
-  const std::string twoTeas =
-      calendarText(noUid + "END:VEVENT\r\n" + noUid + "DESCRIPTION:Green\r\nEND:VEVENT\r\n");
-  // Read again, the same file gives the same identifiers.
-  EXPECT_EQ(readText(twoTeas).records[2].id, readText(twoTeas).records[2].id);
-  EXPECT_EQ(readText(twoTeas).title, "fallback");
-  EXPECT_EQ(readText(calendarText("X-WR-CALNAME:Named\r\n")).title, "Named");
+  // Read again, also with lines added before them, events without UID keep their
+  // identifiers.
+  const std::string teas = noUid + "END:VEVENT\r\n" + noUid + "DESCRIPTION:Green\r\nEND:VEVENT\r\n";
+  const ICalCalendar first = readText(calendarText(teas));
+  const ICalCalendar again = readText(calendarText("X-WR-CALNAME:Named\r\n\r\n" + teas));
+  EXPECT_EQ(first.records[1].id, again.records[1].id);
+  EXPECT_EQ(first.records[2].id, again.records[2].id);
+  EXPECT_EQ(first.title, "fallback");
+  EXPECT_EQ(again.title, "Named");
 }
 
 // Every file of malformed/ is refused with its line and reason, compared with
