@@ -394,9 +394,9 @@ class Converter {
     const std::string encoding = lowerAscii(line.parameter("ENCODING"));
     Data bytes;
     try {
-      if (encoding == "b" || encoding == "base64") {
-        bytes = decodeBase64(line.value);
-      } else if (startsWithIgnoringAsciiCase(trimBlanks(line.value), "data:")) {
+      // A data: URI is one whatever the parameters say: some writers label it ENCODING=b
+      // as well (and base64 has no ':').
+      if (startsWithIgnoringAsciiCase(trimBlanks(line.value), "data:")) {
         // RFC 2397: data:[<media type>][;base64],<data>
         const std::string_view uri = trimBlanks(line.value);
         const std::size_t comma = uri.find(',');
@@ -411,6 +411,8 @@ class Converter {
           const std::string decoded = decodePercent(payload);
           bytes.assign(decoded.begin(), decoded.end());
         }
+      } else if (encoding == "b" || encoding == "base64") {
+        bytes = decodeBase64(line.value);
       } else {
         // A photo by reference (an http: URI) is not fetched.
         return;
