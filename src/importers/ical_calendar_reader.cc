@@ -6,6 +6,7 @@
 #include <cstdlib>
 #include <map>
 #include <memory>
+#include <set>
 #include <utility>
 
 #include "importers/ical_alarm.h"
@@ -146,8 +147,12 @@ struct Related {
 
 class CalendarBuilder {
  public:
-  CalendarBuilder(ICalParsedFiles& files, std::string identifier, std::string title)
-      : files_(files), identifier_(std::move(identifier)), title_(std::move(title)) {}
+  CalendarBuilder(ICalParsedFiles& files, std::string identifier, std::string title,
+                  ImportWarnings& warnings)
+      : files_(files),
+        identifier_(std::move(identifier)),
+        title_(std::move(title)),
+        warnings_(warnings) {}
 
   ICalCalendar build() {
     ICalCalendar calendar;
@@ -162,14 +167,21 @@ class CalendarBuilder {
                               {TesselAttribute_Calendars_Calendar_Title, Value(calendar.title)}};
     calendar.records.push_back({calendar.identifier, {}});
     std::vector<std::string> events, tasks;
+    std::set<std::string> dropped;
     for (Item& item : items_) {
-      (item.kind == ItemKind::Event ? events : tasks).push_back(item.identifier);
-      append(item, calendar.records);
+      try {
+        append(item, calendar.records);
+        (item.kind == ItemKind::Event ? events : tasks).push_back(item.identifier);
+      } catch (const ImportError& fault) {
+        warnings_.fault(fault, "dropped " + ICalDocument::describe(item.component));
+        dropped.insert(item.identifier);
+      }
       // What libical read of the component is not needed once it became records.
       icalcomponent_remove_component(icalcomponent_get_parent(item.component), item.component);
       icalcomponent_free(item.component);
       item.component = nullptr;
     }
+    if (!dropped.empty()) forgetDetached(dropped, calendar.records);
     calendar.eventCount = events.size();
     calendar.taskCount = tasks.size();
     calendarRecord.set(TesselRelationship_Calendars_Calendar_Events, Value(relationship(events)));
@@ -194,6 +206,7 @@ class CalendarBuilder {
                 {}};
       ComponentReader reader(document, *zones, component);
       icalproperty* uidProperty = nullptr;
+      bool unreadable = false;
       for (icalproperty* property : propertiesOf(component)) {
         switch (icalproperty_isa(property)) {
           case ICAL_UID_PROPERTY:
@@ -203,14 +216,20 @@ class CalendarBuilder {
             }
             break;
           case ICAL_RECURRENCEID_PROPERTY:
-            if (!item.recurrenceId) {
+            // Which occurrence a component replaces is what it is: without it, it is dropped.
+            if (item.recurrenceId) break;
+            try {
               item.recurrenceId = reader.date(property, icalproperty_get_recurrenceid(property));
+            } catch (const ImportError& fault) {
+              warnings_.fault(fault, "dropped " + ICalDocument::describe(component));
+              unreadable = true;
             }
             break;
           default:
             break;
         }
       }
+      if (unreadable) continue;
       std::string identifier = identifier_ + (item.kind == ItemKind::Event ? "/event/" : "/task/");
       // RFC 5545 section 3.8.4.7 wants a UID in every component; for the few exporters that
       // leave it out, what the component says stands in: two that say different things stay
@@ -247,6 +266,24 @@ class CalendarBuilder {
       items_.push_back(std::move(item));
     } else {
       items_[known->second] = std::move(item);
+    }
+  }
+
+  // A master does not list the overrides that were dropped.
+  static void forgetDetached(const std::set<std::string>& dropped, std::vector<Record>& records) {
+    for (Record& record : records) {
+      const Value* detached = record.record.find(TesselRelationship_Calendars_Event_DetachedEvents);
+      if (detached == nullptr) continue;
+      std::vector<std::string> kept;
+      for (std::string& id : zt::platform::stringsIn(detached)) {
+        if (dropped.count(id) == 0) kept.push_back(std::move(id));
+      }
+      if (kept.empty()) {
+        record.record.erase(TesselRelationship_Calendars_Event_DetachedEvents);
+      } else {
+        record.record.set(TesselRelationship_Calendars_Event_DetachedEvents,
+                          Value(relationship(kept)));
+      }
     }
   }
 
@@ -327,7 +364,13 @@ class CalendarBuilder {
                       Related& related) const {
     std::size_t count = 0;
     for (icalproperty* rule : fields.rules) {
-      if (auto record = recurrenceRecord(reader, rule, fields.start)) {
+      std::optional<Dictionary> record;
+      try {
+        record = recurrenceRecord(reader, rule, fields.start);
+      } catch (const ImportError& fault) {
+        reader.drop(fault, rule);
+      }
+      if (record) {
         std::string id = item.identifier + "#recurrence" + std::to_string(++count);
         related.recurrences.push_back(id);
         related.records.push_back({std::move(id), std::move(*record)});
@@ -335,8 +378,12 @@ class CalendarBuilder {
     }
     count = 0;
     for (icalcomponent* alarm : componentsOf(item.component, ICAL_VALARM_COMPONENT)) {
-      std::optional<Dictionary> record =
-          alarmRecord(*item.document, *item.zones, alarm, fields.start, fields.end);
+      std::optional<Dictionary> record;
+      try {
+        record = alarmRecord(*item.document, *item.zones, alarm, fields.start, fields.end);
+      } catch (const ImportError& fault) {
+        warnings_.fault(fault, "dropped " + ICalDocument::describe(alarm));
+      }
       if (!record) continue;
       std::string id = item.identifier + "#alarm" + std::to_string(++count);
       const std::string& name = *record->stringAt(TesselRecordEntityNameKey);
@@ -364,17 +411,18 @@ class CalendarBuilder {
   ICalParsedFiles& files_;
   std::string identifier_;
   std::string title_;
+  ImportWarnings& warnings_;
   std::vector<Item> items_;
   std::map<std::string, std::size_t> positions_;
 };
 
 }  // namespace
 
-ICalParsedFiles parseICalFiles(std::vector<ICalFile> files) {
+ICalParsedFiles parseICalFiles(std::vector<ICalFile> files, ImportWarnings& warnings) {
   ICalParsedFiles parsed;
   parsed.documents.reserve(files.size());
   for (ICalFile& file : files) {
-    parsed.documents.push_back(ICalDocument::parse(file.text, file.name));
+    parsed.documents.push_back(ICalDocument::parse(file.text, file.name, warnings));
     std::string().swap(file.text);  // libical holds what is needed of it
     for (icalcomponent* vcalendar : parsed.documents.back().calendars()) {
       for (icalproperty* property : propertiesOf(vcalendar)) {
@@ -391,16 +439,23 @@ ICalParsedFiles parseICalFiles(std::vector<ICalFile> files) {
   return parsed;
 }
 
-ICalCalendar readICalCalendar(ICalParsedFiles files, std::string identifier, std::string title) {
-  return CalendarBuilder(files, std::move(identifier), std::move(title)).build();
+ICalCalendar readICalCalendar(ICalParsedFiles files, std::string identifier, std::string title,
+                              ImportWarnings& warnings) {
+  return CalendarBuilder(files, std::move(identifier), std::move(title), warnings).build();
 }
 
-ICalCalendar readICalCalendar(ICalCalendarSource source) {
-  ICalParsedFiles files = parseICalFiles(std::move(source.files));
+ICalCalendar readICalCalendar(ICalCalendarSource source, ImportWarnings& warnings) {
+  ICalParsedFiles files = parseICalFiles(std::move(source.files), warnings);
   std::string title = source.title        ? *source.title
                       : files.labels.name ? *files.labels.name
                                           : source.fallbackTitle;
-  return readICalCalendar(std::move(files), std::move(source.identifier), std::move(title));
+  return readICalCalendar(std::move(files), std::move(source.identifier), std::move(title),
+                          warnings);
+}
+
+ICalCalendar readICalCalendar(ICalCalendarSource source) {
+  ImportWarnings strict(OnFault::Refuse);
+  return readICalCalendar(std::move(source), strict);
 }
 
 }  // namespace tessel::importers

@@ -5,6 +5,7 @@
 #include <vector>
 
 #include "importers/ical_document.h"
+#include "importers/import_warnings.h"
 #include "tessel/record.h"
 
 namespace tessel::importers {
@@ -29,10 +30,9 @@ struct ICalParsedFiles {
   ICalCalendarLabels labels;
 };
 
-// Parses the files, releasing the text of each once libical has read it. Raises ImportError
-// naming the file and line of the first fault: text libical refuses, a line that is no
-// content line.
-ICalParsedFiles parseICalFiles(std::vector<ICalFile> files);
+// Parses the files, releasing the text of each once libical has read it. Faults go through
+// `warnings` (ICalDocument::parse), which outlives the result.
+ICalParsedFiles parseICalFiles(std::vector<ICalFile> files, ImportWarnings& warnings);
 
 // One calendar read from its files, not yet written anywhere.
 struct ICalCalendar {
@@ -50,10 +50,13 @@ struct ICalCalendar {
 // identifier that starts with the calendar's and a "/", then comes from the component's UID
 // (and RECURRENCE-ID), so that reading the same files again gives the same identifiers. A
 // component without UID is known by what it says; a second component with the UID of
-// another (and no RECURRENCE-ID) is kept as a copy of its own, with a warning. Raises
-// ImportError naming the file and line of the first fault: a date that does not exist, a
-// TZID that nothing defines.
-ICalCalendar readICalCalendar(ICalParsedFiles files, std::string identifier, std::string title);
+// another (and no RECURRENCE-ID) is kept as a copy of its own, with a warning. Each fault
+// goes through `warnings`, naming its file and line: a value libical refuses
+// or a date that does not exist drops its property, or its event or task when that is the
+// start of an event or its RECURRENCE-ID; a time in a TZID that nothing defines is read as
+// a floating time.
+ICalCalendar readICalCalendar(ICalParsedFiles files, std::string identifier, std::string title,
+                              ImportWarnings& warnings);
 
 // What becomes one calendar, for readers without a store: its identifier and files, and a
 // title the source fixes, else the files' X-WR-CALNAME, else `fallbackTitle`.
@@ -64,7 +67,9 @@ struct ICalCalendarSource {
   std::string fallbackTitle;
 };
 
-// parseICalFiles and readICalCalendar in one step.
+// parseICalFiles and readICalCalendar in one step, each fault through `warnings`.
+ICalCalendar readICalCalendar(ICalCalendarSource source, ImportWarnings& warnings);
+// The same, raising ImportError at the first fault.
 ICalCalendar readICalCalendar(ICalCalendarSource source);
 
 }  // namespace tessel::importers

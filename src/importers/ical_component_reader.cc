@@ -5,7 +5,6 @@
 #include <utility>
 
 #include "importers/ical_properties.h"
-#include "importers/import_warning.h"
 #include "platform/calendar_day.h"
 
 namespace tessel::importers::ical {
@@ -20,7 +19,12 @@ ImportError ComponentReader::error(icalproperty* property, std::string reason) c
 void ComponentReader::warn(icalproperty* property, std::string_view text) const {
   std::optional<std::size_t> line = ICalDocument::lineOf(property);
   if (!line) line = ICalDocument::lineOf(component_);
-  importWarning(document_.source(), line, text);
+  document_.warnings().note(document_.source(), line, std::string(text));
+}
+
+void ComponentReader::drop(const ImportError& fault, icalproperty* property) const {
+  document_.warnings().fault(
+      fault, "dropped the " + name(property) + " of " + ICalDocument::describe(component_));
 }
 
 std::string ComponentReader::name(icalproperty* property) const {
@@ -56,11 +60,12 @@ ReadDate ComponentReader::date(icalproperty* property, const icaltimetype& t,
   }
   if (std::optional<std::string> tzid = parameter(property, "TZID")) {
     std::optional<TimeZone> zone = zones_.zone(*tzid);
-    if (!zone) {
-      throw error(property, name(property) + ": no VTIMEZONE defines the time zone \"" + *tzid +
-                                "\", and it is no IANA or Windows zone name");
-    }
-    return {CalendarDate::fromFields(fields, zoneOfUtcTime(*zone, fields)), false};
+    if (zone) return {CalendarDate::fromFields(fields, zoneOfUtcTime(*zone, fields)), false};
+    document_.warnings().fault(
+        error(property, name(property) + ": no VTIMEZONE defines the time zone \"" + *tzid +
+                            "\", and it is no IANA or Windows zone name"),
+        "read the " + name(property) + " of " + ICalDocument::describe(component_) +
+            " as a floating time");
   }
   return {CalendarDate::fromFields(fields, floatingZone ? *floatingZone : TimeZone::local()),
           false};

@@ -33,12 +33,17 @@ class ComponentReader {
   // A warning at the line of `property`, or of the component when it is null.
   void warn(icalproperty* property, std::string_view text) const;
 
+  // `fault` costs `property`: a warning that names it and the component, or with
+  // OnFault::Refuse the fault raised.
+  void drop(const ImportError& fault, icalproperty* property) const;
+
   // The property's name as messages give it.
   std::string name(icalproperty* property) const;
 
   // RFC 5545 section 3.3.4 and 3.3.5: DATE values are whole days (kept as 12:00 GMT, as
   // the schema wants), "Z" times are UTC, TZID times are in that zone and the others
-  // floating, which the local zone stands for.
+  // floating, which the local zone stands for. A TZID that nothing defines is a fault; the
+  // time is then read as floating.
   ReadDate date(icalproperty* property, const icaltimetype& t,
                 const std::optional<zt::platform::TimeZone>& floatingZone = std::nullopt) const;
 

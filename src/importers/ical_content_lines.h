@@ -6,6 +6,8 @@
 #include <string_view>
 #include <vector>
 
+#include "importers/import_warnings.h"
+
 namespace tessel::importers {
 
 // One content line of an iCalendar file after unfolding, with the 1-based line of the file on
@@ -24,15 +26,20 @@ struct ICalContentLine {
 
 // Reads the text of one iCalendar file into its content lines: checks that it is UTF-8,
 // unfolds it (RFC 5545 section 3.1), and checks that its components nest as BEGIN and END
-// say, inside VCALENDAR objects. Lines that hold nothing (blank lines, properties with an
-// empty value, libical's own X-LIC-ERROR remarks) are left out. Raises ImportError naming
-// `source` and the line of the first fault.
-std::vector<ICalContentLine> readICalContentLines(std::string_view text, const std::string& source);
-
-// The same content lines, handed to `visit` one by one as they are read, so that no copy of
-// the whole text is held. The faults are the same, raised when the reading reaches them:
-// `visit` has then seen the lines before the fault.
+// say, inside VCALENDAR objects. Events, tasks and zones that a file holds without a
+// VCALENDAR around them are read as if it were there. Lines that hold nothing (blank lines,
+// properties with an empty value, libical's own X-LIC-ERROR remarks) are left out.
+// Each fault goes through `warnings` when the reading reaches it (`visit` has then seen the
+// lines before it): a line that is no content line, or that stands outside any component,
+// is left out; an END that closes nothing is left out, and components that the file leaves
+// open are closed where their parent or the file ends. Text that is not UTF-8, too deep a
+// nesting and a file without any component raise ImportError naming `source` and the line.
 void forEachICalContentLine(std::string_view text, const std::string& source,
-                            const std::function<void(ICalContentLine&)>& visit);
+                            const std::function<void(ICalContentLine&)>& visit,
+                            ImportWarnings& warnings);
+
+// The content lines of forEachICalContentLine in one list.
+std::vector<ICalContentLine> readICalContentLines(std::string_view text, const std::string& source,
+                                                  ImportWarnings& warnings);
 
 }  // namespace tessel::importers

@@ -7,6 +7,7 @@
 #include <set>
 #include <string_view>
 #include <system_error>
+#include <unordered_set>
 
 #include "importers/import_file.h"
 #include "importers/stable_hash.h"
@@ -191,7 +192,9 @@ StoredCalendars storedCalendars(const Store& store, const std::vector<ICalCalend
 void mergeCalendar(ICalCalendar& calendar, const RecordMap& before,
                    const Dictionary* calendarBefore, SyncDeletes syncDeletes,
                    std::vector<Record>& records, std::vector<std::string>& stale) {
-  std::set<std::string> produced;
+  // Views of the records' identifiers, used before the records are moved out below.
+  std::unordered_set<std::string_view> produced;
+  produced.reserve(calendar.records.size());
   for (const Record& record : calendar.records) produced.insert(record.id);
 
   std::vector<Record>& written = calendar.records;
@@ -277,7 +280,8 @@ std::vector<KnownCalendar> knownCalendars(const Store& store) {
   return known;
 }
 
-std::vector<ICalPath> parseICalendarPaths(const std::vector<fs::path>& paths) {
+std::vector<ICalPath> parseICalendarPaths(const std::vector<fs::path>& paths,
+                                          ImportWarnings& warnings) {
   std::vector<ICalPath> parsed;
   std::set<std::string> seen;
   for (const fs::path& path : paths) {
@@ -286,7 +290,7 @@ std::vector<ICalPath> parseICalendarPaths(const std::vector<fs::path>& paths) {
     // The same file or folder named twice is read once.
     one.pathIdentifier = calendarIdentifierForPath(path);
     if (!seen.insert(one.pathIdentifier).second) continue;
-    one.files = parseICalFiles(filesOf(path, one.name));
+    one.files = parseICalFiles(filesOf(path, one.name), warnings);
     std::error_code error;
     if (fs::is_directory(path, error)) {
       one.sourceTitle = vdirDisplayName(path);
@@ -303,7 +307,8 @@ std::vector<ICalPath> parseICalendarPaths(const std::vector<fs::path>& paths) {
 
 std::vector<ICalCalendar> readICalendarPaths(std::vector<ICalPath> paths,
                                              const ICalImportTarget& target,
-                                             std::vector<KnownCalendar> known) {
+                                             std::vector<KnownCalendar> known,
+                                             ImportWarnings& warnings) {
   struct Pending {
     std::string identifier;
     std::string title;
@@ -346,7 +351,7 @@ std::vector<ICalCalendar> readICalendarPaths(std::vector<ICalPath> paths,
   calendars.reserve(pending.size());
   for (Pending& calendar : pending) {
     calendars.push_back(readICalCalendar(std::move(calendar.files), std::move(calendar.identifier),
-                                         std::move(calendar.title)));
+                                         std::move(calendar.title), warnings));
   }
   return calendars;
 }
@@ -354,7 +359,8 @@ std::vector<ICalCalendar> readICalendarPaths(std::vector<ICalPath> paths,
 std::vector<ICalCalendar> readICalendarPaths(const std::vector<fs::path>& paths,
                                              const ICalImportTarget& target,
                                              std::vector<KnownCalendar> known) {
-  return readICalendarPaths(parseICalendarPaths(paths), target, std::move(known));
+  ImportWarnings strict(OnFault::Refuse);
+  return readICalendarPaths(parseICalendarPaths(paths, strict), target, std::move(known), strict);
 }
 
 ICalImportCounts writeICalCalendars(Store& store, const std::vector<ICalCalendar>& calendars,

@@ -43,10 +43,12 @@ struct ICalPath {
   ICalParsedFiles files;
 };
 
-// Parses every path: a file, or every *.ics file of a folder. Raises ImportError at the
-// first fault of any file, a path that is neither a file nor a folder and a folder without
-// any .ics file included. Needs no store.
-std::vector<ICalPath> parseICalendarPaths(const std::vector<std::filesystem::path>& paths);
+// Parses every path: a file, or every *.ics file of a folder. Needs no store. Faults go
+// through `warnings` (ICalDocument::parse), which outlives the result; a path that is
+// neither a file nor a folder, a folder without any .ics file, or a file that cannot be read
+// or is not an iCalendar file raises ImportError.
+std::vector<ICalPath> parseICalendarPaths(const std::vector<std::filesystem::path>& paths,
+                                          ImportWarnings& warnings);
 
 // Reads every path into its calendar.
 //
@@ -59,12 +61,13 @@ std::vector<ICalPath> parseICalendarPaths(const std::vector<std::filesystem::pat
 // unless that one is of another X-WR-RELCALID; else a new one. Paths that are the same
 // calendar are read together as one.
 //
-// Raises ImportError at the first fault of any file, and for a title that more than one
-// calendar of `known` has.
+// Faults go through `warnings` (readICalCalendar); a title that more than one calendar of
+// `known` has raises ImportError.
 std::vector<ICalCalendar> readICalendarPaths(std::vector<ICalPath> paths,
                                              const ICalImportTarget& target,
-                                             std::vector<KnownCalendar> known);
-// parseICalendarPaths, then readICalendarPaths.
+                                             std::vector<KnownCalendar> known,
+                                             ImportWarnings& warnings);
+// parseICalendarPaths, then readICalendarPaths, raising ImportError at the first fault.
 std::vector<ICalCalendar> readICalendarPaths(const std::vector<std::filesystem::path>& paths,
                                              const ICalImportTarget& target = {},
                                              std::vector<KnownCalendar> known = {});

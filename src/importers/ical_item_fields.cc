@@ -10,13 +10,14 @@ using zt::platform::lowerAscii;
 ItemFields readFields(const ComponentReader& reader, icalcomponent* component) {
   ItemFields fields;
   icalproperty* duration = nullptr;
+  const bool task = icalcomponent_isa(component) == ICAL_VTODO_COMPONENT;
   // These may appear once (RFC 5545 section 3.6.1); of two, the first counts, as calendar
   // programs read them, and the other is named in a warning.
   const auto secondOf = [&](const std::optional<ReadDate>& first, icalproperty* property) {
     if (first) reader.warn(property, "a second " + reader.name(property) + ": ignored");
     return first.has_value();
   };
-  for (icalproperty* property : propertiesOf(component)) {
+  const auto read = [&](icalproperty* property) {
     switch (icalproperty_isa(property)) {
       case ICAL_SUMMARY_PROPERTY:
         fields.summary = text(icalproperty_get_summary(property));
@@ -78,13 +79,26 @@ ItemFields readFields(const ComponentReader& reader, icalcomponent* component) {
       default:
         break;
     }
+  };
+  for (icalproperty* property : propertiesOf(component)) {
+    try {
+      read(property);
+    } catch (const ImportError& fault) {
+      // An event is where and when it starts: without its start it is dropped as a whole.
+      if (!task && icalproperty_isa(property) == ICAL_DTSTART_PROPERTY) throw;
+      reader.drop(fault, property);
+    }
   }
-  const bool task = icalcomponent_isa(component) == ICAL_VTODO_COMPONENT;
   std::optional<ReadDate>& finish = task ? fields.due : fields.end;
   if (!finish && fields.start) {
     if (duration != nullptr) {
-      finish = reader.plus(duration, *fields.start, icalproperty_get_duration(duration));
-    } else if (!task) {
+      try {
+        finish = reader.plus(duration, *fields.start, icalproperty_get_duration(duration));
+      } catch (const ImportError& fault) {
+        reader.drop(fault, duration);
+      }
+    }
+    if (!finish && !task) {
       // Section 3.6.1: without DTEND or DURATION an event of a DATE lasts that day, one of
       // a DATE-TIME lasts no time.
       icaldurationtype day = icaldurationtype_null_duration();

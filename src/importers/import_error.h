@@ -7,6 +7,11 @@
 
 namespace tessel::importers {
 
+// "contacts.vcf: line 12: <text>", or "contacts.vcf: <text>" without a line: how faults and
+// warnings point at what they are about.
+std::string locatedText(const std::string& source, std::optional<std::size_t> line,
+                        const std::string& text);
+
 // What is wrong with an imported file, and where: the file (or the name the text was given)
 // and the 1-based line on which the faulty property, card or component starts. Its text reads
 // "contacts.vcf: line 12: bad base64 in PHOTO" or "work.ics: line 12: DTSTART: February has

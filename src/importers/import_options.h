@@ -6,4 +6,8 @@ namespace tessel::importers {
 // calendars, of the same calendar) that it no longer produces.
 enum class SyncDeletes { Off, On };
 
+// What a fault in an imported file costs: only what cannot be read (a property, else its
+// component or card), with a warning; or, with Refuse, the whole import.
+enum class OnFault { Skip, Refuse };
+
 }  // namespace tessel::importers

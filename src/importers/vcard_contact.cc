@@ -106,39 +106,84 @@ std::string_view phoneType(const ContentLine& line) {
 
 class Converter {
  public:
-  Converter(const Card& card, const std::string& source)
+  Converter(const Card& card, const std::string& source, ImportWarnings& warnings)
       : card_(card),
         source_(source),
+        warnings_(warnings),
         version21_(card.version == "2.1"),
         escapes_(version21_ ? TextEscapes::Version21 : TextEscapes::Version3) {}
 
   ConvertedCard convert() {
     result_.line = card_.line;
-    for (const ContentLine& line : card_.properties) property(line);
-    if (result_.kind == CardKind::Group) return finishGroup();
+    for (const ContentLine& line : card_.properties) {
+      try {
+        property(line);
+      } catch (const ImportError& fault) {
+        noteFault(fault, "dropped the " + line.name, "");
+      }
+    }
+    if (result_.kind == CardKind::Group) {
+      ConvertedCard group = finishGroup();
+      reportFaults();
+      return group;
+    }
     finishContact();
+    reportFaults();
     return std::move(result_);
   }
 
  private:
   // The value's text in UTF-8, still escaped: transfer encoding and charset undone.
   std::string rawText(const ContentLine& line) const {
+    std::string bytes;
     try {
       const std::string encoding = lowerAscii(line.parameter("ENCODING"));
-      const std::string_view charset = line.parameter("CHARSET");
-      const std::optional<std::string_view> named =
-          charset.empty() ? std::nullopt : std::optional<std::string_view>(charset);
       if (encoding == "quoted-printable") {
-        return toUtf8(decodeQuotedPrintable(line.value), named);
+        bytes = decodeQuotedPrintable(line.value);
+      } else if (encoding == "b" || encoding == "base64") {
+        const Data decoded = decodeBase64(line.value);
+        bytes.assign(decoded.begin(), decoded.end());
+      } else {
+        bytes = line.value;
       }
-      if (encoding == "b" || encoding == "base64") {
-        const Data bytes = decodeBase64(line.value);
-        return toUtf8(std::string(bytes.begin(), bytes.end()), named);
-      }
-      return toUtf8(line.value, named);
     } catch (const std::invalid_argument& e) {
       throw ImportError(source_, line.line, std::string(e.what()) + " in " + line.name);
     }
+    const std::string_view charset = line.parameter("CHARSET");
+    if (charset.empty()) return toUtf8(bytes, std::nullopt);
+    try {
+      return toUtf8(bytes, charset);
+    } catch (const std::invalid_argument& e) {
+      // The text is still there: read as if no charset were named, it is most often right
+      // (writers name charsets they do not use), and it is never lost.
+      std::string text = toUtf8(bytes, std::nullopt);
+      noteFault(ImportError(source_, line.line, std::string(e.what()) + " in " + line.name),
+                "read the " + line.name, text == bytes ? " as UTF-8" : " as Windows-1252");
+      return text;
+    }
+  }
+
+  // A fault of this card: raised at once when the import refuses faults, else reported
+  // with the card's name once the card is read. A value read twice is reported once.
+  // What it cost reads `action` (of the card ...) `tail`.
+  void noteFault(const ImportError& fault, std::string action, std::string tail) const {
+    if (warnings_.onFault() == OnFault::Refuse) throw fault;
+    for (const CardFault& known : faults_) {
+      if (known.fault.line() == fault.line() && known.fault.reason() == fault.reason()) return;
+    }
+    faults_.push_back({fault, std::move(action), std::move(tail)});
+  }
+
+  void reportFaults() {
+    std::string name = !formatted_.empty() ? "\"" + formatted_ + "\""
+                       : !(first_ + last_).empty()
+                           ? "\"" + joinNonEmpty({first_, last_}, " ") + "\""
+                       : !company_.empty() ? "\"" + company_ + "\""
+                                           : "of line " + std::to_string(card_.line);
+    for (const CardFault& each : faults_) {
+      warnings_.fault(each.fault, each.action + " of the card " + name + each.tail);
+    }
+    faults_.clear();
   }
 
   std::string text(const ContentLine& line) const { return cleanText(rawText(line)); }
@@ -505,6 +550,12 @@ class Converter {
 
   const Card& card_;
   const std::string& source_;
+  ImportWarnings& warnings_;
+  struct CardFault {
+    ImportError fault;
+    std::string action, tail;
+  };
+  mutable std::vector<CardFault> faults_;
   const bool version21_;
   const TextEscapes escapes_;
   ConvertedCard result_;
@@ -518,8 +569,8 @@ class Converter {
 
 }  // namespace
 
-ConvertedCard convertCard(const Card& card, const std::string& source) {
-  return Converter(card, source).convert();
+ConvertedCard convertCard(const Card& card, const std::string& source, ImportWarnings& warnings) {
+  return Converter(card, source, warnings).convert();
 }
 
 }  // namespace tessel::importers

@@ -7,6 +7,7 @@
 #include <string_view>
 #include <vector>
 
+#include "importers/import_warnings.h"
 #include "importers/vcard_reader.h"
 #include "platform/value.h"
 #include "tessel/record.h"
@@ -38,9 +39,11 @@ struct ConvertedCard {
 };
 
 // Decodes every property (transfer encoding, charset, escapes) and maps what the contacts
-// schema holds. Raises ImportError naming `source` and the property's line for a value that
-// cannot be decoded: bad base64 or quoted-printable, an unknown or mismatched charset.
-// A group card without a name converts to a group without names, which the import skips.
-ConvertedCard convertCard(const Card& card, const std::string& source);
+// schema holds. A value that cannot be decoded (bad base64 or quoted-printable) is a fault
+// at the property's line that drops the property; one in an unknown or mismatched charset
+// is read as text without a charset instead. Each goes through `warnings`, which names the
+// card. A group card without a name converts to a group without names, which the import
+// skips.
+ConvertedCard convertCard(const Card& card, const std::string& source, ImportWarnings& warnings);
 
 }  // namespace tessel::importers

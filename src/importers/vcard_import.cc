@@ -9,6 +9,7 @@
 
 #include "importers/import_error.h"
 #include "importers/import_file.h"
+#include "importers/import_kind.h"
 #include "importers/vcard_decoding.h"
 #include "importers/vcard_identifiers.h"
 #include "importers/vcard_reader.h"
@@ -135,20 +136,27 @@ void VCardImport::addText(std::string_view text, const std::string& source) {
   // Each card is converted as soon as it is read, so that the cards are not all held at
   // once. A fault of syntax still comes before a fault of conversion in an earlier card, as
   // when the whole file was read first: on a fault of conversion, the rest is read through.
+  checkImportKind(text, ImportKind::VCard, source);
+  ImportWarnings strict(OnFault::Refuse);
+  ImportWarnings& warnings = warnings_ != nullptr ? *warnings_ : strict;
   std::vector<ConvertedCard> converted;
   std::exception_ptr conversionFault;
   struct Stop {};
   try {
-    forEachCard(text, source, [&](Card& card) {
-      try {
-        converted.push_back(convertCard(card, source));
-      } catch (...) {
-        conversionFault = std::current_exception();
-        throw Stop{};
-      }
-    });
+    forEachCard(
+        text, source,
+        [&](Card& card) {
+          try {
+            converted.push_back(convertCard(card, source, warnings));
+          } catch (...) {
+            conversionFault = std::current_exception();
+            throw Stop{};
+          }
+        },
+        warnings);
   } catch (const Stop&) {
-    forEachCard(text, source, [](Card&) {});
+    forEachCard(
+        text, source, [](Card&) {}, warnings);
     std::rethrow_exception(conversionFault);
   }
   for (ConvertedCard& card : converted) {

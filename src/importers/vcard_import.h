@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "importers/import_options.h"
+#include "importers/import_warnings.h"
 #include "importers/vcard_contact.h"
 #include "tessel/record.h"
 #include "tessel/store.h"
@@ -23,10 +24,14 @@ struct VCardImportSummary {
 };
 
 // An import of vCard 2.1, 3.0 and 4.0 address books into the contacts schema, in two
-// phases: every input is read and converted first (a fault raises ImportError naming the file
-// and line, and nothing has been written), then everything is written at once.
+// phases: every input is read and converted first, then everything is written at once.
+// A fault costs what cannot be read (a line, a property) with a warning in `warnings`, or
+// with OnFault::Refuse (and without `warnings`) raises ImportError naming the file and line
+// before anything has been written. A file that cannot be read at all, or that is not a
+// vCard file, always raises it.
 //
-//   VCardImport import;
+//   ImportWarnings warnings(OnFault::Skip);
+//   VCardImport import(warnings);
 //   import.addPaths({"contacts.vcf", "vdir/"});
 //   VCardImportSummary summary = import.writeTo(store, SyncDeletes::Off);
 //
@@ -37,6 +42,11 @@ struct VCardImportSummary {
 // groups whose members are the cards with the UIDs they list.
 class VCardImport {
  public:
+  // Faults raise ImportError.
+  VCardImport() = default;
+  // Faults go through `warnings`, which outlives the import.
+  explicit VCardImport(ImportWarnings& warnings) : warnings_(&warnings) {}
+
   // Files, and folders of which every *.vcf file is read in name order (a vdir).
   void addPaths(const std::vector<std::filesystem::path>& paths);
   void addFile(const std::filesystem::path& file);
@@ -74,6 +84,7 @@ class VCardImport {
   std::map<std::string, std::size_t, std::less<>> contactIndex_;
   std::vector<ConvertedCard> groupCards_;
   std::size_t files_ = 0;
+  ImportWarnings* warnings_ = nullptr;
 };
 
 }  // namespace tessel::importers

@@ -105,6 +105,17 @@ class LineParser {
   std::size_t pos_ = 0;
 };
 
+bool endsWithSoftBreak(std::string_view value) {
+  const std::size_t last = value.find_last_not_of(" \t");
+  return last != std::string_view::npos && value[last] == '=';
+}
+
+// Whether a line not yet parsed ends with a soft break of a quoted-printable value.
+bool endsWithSoftBreakOfQp(std::string_view line) {
+  if (!endsWithSoftBreak(line)) return false;
+  return upperAscii(line.substr(0, line.find(':'))).find("QUOTED-PRINTABLE") != std::string::npos;
+}
+
 bool isEncoding(const ContentLine& line, std::string_view lowerCaseEncoding) {
   return lowerAscii(line.parameter("ENCODING")) == lowerCaseEncoding;
 }
@@ -154,36 +165,49 @@ bool ContentLine::hasType(std::string_view lowerCaseType) const {
 
 std::vector<Card> readCards(std::string_view input, const std::string& source) {
   std::vector<Card> cards;
-  forEachCard(input, source, [&](Card& card) { cards.push_back(std::move(card)); });
+  ImportWarnings strict(OnFault::Refuse);
+  forEachCard(
+      input, source, [&](Card& card) { cards.push_back(std::move(card)); }, strict);
   return cards;
 }
 
 void forEachCard(std::string_view input, const std::string& source,
-                 const std::function<void(Card&)>& visit) {
+                 const std::function<void(Card&)>& visit, ImportWarnings& warnings) {
   const std::string text = decodeWholeText(input, source);
   const std::vector<PhysicalLine> lines = physicalLines(text);
   Card card;
   // Depth of BEGIN:VCARD; cards nested in a vCard 2.1 AGENT property are skipped.
   int depth = 0;
+  bool sawCard = false;
+  std::optional<std::size_t> firstOutside;
   std::size_t i = 0;
   while (i < lines.size()) {
     const PhysicalLine& first = lines[i++];
     if (trimBlanks(first.text).empty()) continue;
-    // RFC 2425 section 5.8.1: a line end followed by one blank is removed with the blank.
+    // RFC 2425 section 5.8.1: a line end followed by one blank is removed with the blank;
+    // but after a quoted-printable soft break the next line is the value's, blank included.
     std::string logical(first.text);
-    while (i < lines.size() && startsWithBlank(lines[i].text)) {
+    while (i < lines.size() && startsWithBlank(lines[i].text) && !endsWithSoftBreakOfQp(logical)) {
       logical.append(lines[i++].text.substr(1));
     }
-    ContentLine content = LineParser(logical, first.number, source).parse();
+    ContentLine content;
+    try {
+      content = LineParser(logical, first.number, source).parse();
+    } catch (const ImportError& fault) {
+      if (depth == 0 && !firstOutside) firstOutside = first.number;
+      warnings.fault(
+          fault, depth > 0 ? "dropped this line of the card of line " + std::to_string(card.line)
+                           : std::string("dropped this line"));
+      continue;
+    }
     if (isEncoding(content, "quoted-printable")) {
-      // RFC 2045 section 6.7: a "=" at the end of a line is a soft break; the value goes on
-      // on the next line as it is, not folded.
-      while (content.value.ends_with('=') && i < lines.size()) {
+      // RFC 2045 section 6.7: a "=" at the end of a line, maybe followed by blanks that a
+      // transport added, is a soft break; the value goes on on the next line as it is, a
+      // leading blank included, not folded.
+      while (endsWithSoftBreak(content.value) && i < lines.size()) {
+        while (content.value.back() != '=') content.value.pop_back();
         content.value.pop_back();
         content.value.append(lines[i++].text);
-        while (i < lines.size() && startsWithBlank(lines[i].text)) {
-          content.value.append(lines[i++].text.substr(1));
-        }
       }
     } else if (isEncoding(content, "base64") || isEncoding(content, "b")) {
       // Some vCard 2.1 writers break base64 into lines that are not indented; base64 has no
@@ -197,10 +221,15 @@ void forEachCard(std::string_view input, const std::string& source,
     const bool isVCardMarker = lowerAscii(trimBlanks(content.value)) == "vcard";
     if (content.name == "BEGIN" && isVCardMarker) {
       if (depth++ == 0) card = Card{first.number, {}, {}};
+      sawCard = true;
       continue;
     }
     if (content.name == "END" && isVCardMarker) {
-      if (depth == 0) throw ImportError(source, first.number, "END:VCARD without BEGIN:VCARD");
+      if (depth == 0) {
+        warnings.fault(ImportError(source, first.number, "END:VCARD without BEGIN:VCARD"),
+                       "dropped this line");
+        continue;
+      }
       if (--depth == 0) {
         visit(card);
         card = Card{};
@@ -208,8 +237,11 @@ void forEachCard(std::string_view input, const std::string& source,
       continue;
     }
     if (depth == 0) {
-      throw ImportError(source, first.number,
-                        content.name + " outside of a card (BEGIN:VCARD ... END:VCARD)");
+      if (!firstOutside) firstOutside = first.number;
+      warnings.fault(ImportError(source, first.number,
+                                 content.name + " outside of a card (BEGIN:VCARD ... END:VCARD)"),
+                     "dropped this line");
+      continue;
     }
     if (depth > 1) continue;
     if (content.name == "VERSION") {
@@ -218,8 +250,14 @@ void forEachCard(std::string_view input, const std::string& source,
     }
     card.properties.push_back(std::move(content));
   }
+  // Text without a single card is no address book with a few bad lines.
+  if (!sawCard && firstOutside) {
+    throw ImportError(source, firstOutside, "no BEGIN:VCARD: this is not a vCard file");
+  }
   if (depth > 0) {
-    throw ImportError(source, card.line, "card has no END:VCARD");
+    warnings.fault(ImportError(source, card.line, "card has no END:VCARD"),
+                   "kept what the card holds up to the end of the file");
+    visit(card);
   }
 }
 

@@ -9,6 +9,8 @@
 #include <string_view>
 #include <vector>
 
+#include "importers/import_warnings.h"
+
 namespace tessel::importers {
 
 struct Parameter {
@@ -45,9 +47,11 @@ struct Card {
 std::vector<Card> readCards(std::string_view text, const std::string& source);
 
 // The same cards, handed to `visit` one by one as each ends, so that they are not all held
-// at once. The faults are the same, raised when the reading reaches them: `visit` has then
-// seen the cards before the fault.
+// at once. Each fault goes through `warnings` when the reading reaches it (`visit` has then
+// seen the cards before it): a line that cannot be read is left out, and a card that the
+// file ends inside is kept. A text of UTF-16 that is not valid, or with lines but no card at
+// all, raises ImportError.
 void forEachCard(std::string_view text, const std::string& source,
-                 const std::function<void(Card&)>& visit);
+                 const std::function<void(Card&)>& visit, ImportWarnings& warnings);
 
 }  // namespace tessel::importers

@@ -72,6 +72,14 @@ std::int64_t Connection::changes() const {
   return sqlite3_changes64(db_);
 }
 
+std::int64_t Connection::lastInsertKey() const {
+  return sqlite3_last_insert_rowid(db_);
+}
+
+void Connection::forgetLastInsertKey() {
+  sqlite3_set_last_insert_rowid(db_, 0);
+}
+
 void Connection::fail(int code, std::string_view doing) const {
   std::string message = db_ ? sqlite3_errmsg(db_) : sqlite3_errstr(code);
   if ((code & 0xff) == SQLITE_BUSY) message = "the store stayed busy (" + message + ")";

@@ -27,6 +27,10 @@ class Connection {
   // A statement prepared once per connection and reused; reset it after use (StatementReset).
   Statement& cached(std::string_view sql);
   std::int64_t changes() const;
+  // The key of the row the last INSERT added; 0 after forgetLastInsertKey() until one adds a row
+  // (an upsert that updates adds none).
+  std::int64_t lastInsertKey() const;
+  void forgetLastInsertKey();
 
   sqlite3* handle() const { return db_; }
   [[noreturn]] void fail(int code, std::string_view doing) const;

@@ -1,12 +1,15 @@
+#include <algorithm>
 #include <cmath>
 #include <cstdint>
+#include <cstring>
+#include <functional>
 #include <limits>
-#include <unordered_map>
 #include <unordered_set>
 #include <utility>
 
 #include "tessel/record_json.h"
 #include "tessel/record_json_path.h"
+#include "tessel/record_json_scanner.h"
 #include "tessel/record_json_values.h"
 #include "tessel/schema.h"
 
@@ -250,7 +253,23 @@ Dictionary recordFromJson(std::string_view json) {
 
 std::vector<Record> parseRecordLines(std::string_view text) {
   std::vector<Record> out;
-  std::unordered_map<std::string, std::size_t> lineOfId;
+  // Room for every line, but no more than a text of short lines can hold: a text of nothing
+  // but line ends must not reserve a record per byte.
+  std::size_t lines = 1;
+  for (const char *at = text.data(), *end = at + text.size();
+       (at = static_cast<const char*>(std::memchr(at, '\n', static_cast<std::size_t>(end - at))));
+       ++at) {
+    ++lines;
+  }
+  out.reserve(std::min(lines, text.size() / 32 + 1));
+  // The records read so far by identifier, as indexes into `out`, which may still move.
+  std::vector<std::size_t> lineOf;
+  lineOf.reserve(out.capacity());
+  const auto idHash = [&out](std::size_t i) { return std::hash<std::string_view>{}(out[i].id); };
+  const auto sameId = [&out](std::size_t a, std::size_t b) { return out[a].id == out[b].id; };
+  std::unordered_set<std::size_t, decltype(idHash), decltype(sameId)> seen(out.capacity(), idHash,
+                                                                           sameId);
+  typed_json::RecordLineScanner scanner;
   std::size_t lineNumber = 0;
   while (!text.empty()) {
     ++lineNumber;
@@ -260,14 +279,17 @@ std::vector<Record> parseRecordLines(std::string_view text) {
     if (!line.empty() && line.back() == '\r') line.remove_suffix(1);
     if (line.find_first_not_of(" \t") == std::string_view::npos) continue;
 
-    Record record = onLine(lineNumber, [&] { return recordLineFromJson(parseJson(line)); });
-    auto [it, inserted] = lineOfId.emplace(record.id, lineNumber);
+    std::optional<Record> scanned = scanner.scan(line);
+    out.push_back(scanned ? std::move(*scanned) : onLine(lineNumber, [&] {
+      return recordLineFromJson(parseJson(line));
+    }));
+    lineOf.push_back(lineNumber);
+    auto [it, inserted] = seen.insert(out.size() - 1);
     if (!inserted) {
       throw RecordJsonError(lineNumber, "id",
-                            "identifier " + jsonQuoted(record.id) + " was already given on line " +
-                                std::to_string(it->second));
+                            "identifier " + jsonQuoted(out.back().id) +
+                                " was already given on line " + std::to_string(lineOf[*it]));
     }
-    out.push_back(std::move(record));
   }
   return out;
 }

@@ -57,40 +57,37 @@ struct WallClock {
 };
 
 // "YYYY-MM-DDTHH:MM[:SS[.fraction]]"; the year may have more than four digits and a sign, so
-// that every date the store can hold has a written form.
-std::optional<WallClock> parseWallClock(std::string_view text, std::string& why) {
+// that every date the store can hold has a written form. Says why in `why` when given: the
+// quick scanner of JSON Lines reads dates by the thousand and needs no reason.
+std::optional<WallClock> parseWallClock(std::string_view text, std::string* why) {
   namespace iso = zt::platform::iso;
-  const std::string quoted = jsonQuoted(text);
-  why = "date " + quoted + " is not of the form YYYY-MM-DDTHH:MM[:SS[.fraction]]";
+  const auto refuse = [&](const std::string& reason) -> std::optional<WallClock> {
+    if (why != nullptr) *why = "date " + jsonQuoted(text) + reason;
+    return std::nullopt;
+  };
+  const char* const kForm = " is not of the form YYYY-MM-DDTHH:MM[:SS[.fraction]]";
   std::size_t pos = 0;
   iso::ReadFault fault = iso::ReadFault::Form;
   const std::optional<iso::WallClock> read =
       iso::readWallClock(text, pos, iso::YearForm::Extended, iso::SecondsForm::Optional, &fault);
   if (!read) {
-    if (fault == iso::ReadFault::LongFraction) {
-      why = "date " + quoted + " has more than nine fractional digits";
-    }
-    return std::nullopt;
+    return refuse(fault == iso::ReadFault::LongFraction ? " has more than nine fractional digits"
+                                                        : kForm);
   }
-  if (pos != text.size()) return std::nullopt;
+  if (pos != text.size()) return refuse(kForm);
 
   const iso::WallClock& f = *read;
   switch (iso::firstInvalidField(f)) {
     case iso::Field::Month:
-      why = "date " + quoted + " has month " + std::to_string(f.month);
-      return std::nullopt;
+      return refuse(" has month " + std::to_string(f.month));
     case iso::Field::Day:
-      why = "date " + quoted + " has day " + std::to_string(f.day) + ", not in that month";
-      return std::nullopt;
+      return refuse(" has day " + std::to_string(f.day) + ", not in that month");
     case iso::Field::Hour:
-      why = "date " + quoted + " has hour " + std::to_string(f.hour);
-      return std::nullopt;
+      return refuse(" has hour " + std::to_string(f.hour));
     case iso::Field::Minute:
-      why = "date " + quoted + " has minute " + std::to_string(f.minute);
-      return std::nullopt;
+      return refuse(" has minute " + std::to_string(f.minute));
     case iso::Field::Second:
-      why = "date " + quoted + " has second " + std::to_string(f.second);
-      return std::nullopt;
+      return refuse(" has second " + std::to_string(f.second));
     case iso::Field::None:
       break;
   }
@@ -99,6 +96,13 @@ std::optional<WallClock> parseWallClock(std::string_view text, std::string& why)
                   static_cast<int>(f.hour), static_cast<int>(f.minute), static_cast<int>(f.second)};
   clock.nanoseconds = f.nanoseconds;
   return clock;
+}
+
+// A wall-clock time shown twice (autumn fold) reads as its earlier instant; the typed form has
+// no offset to say otherwise.
+Value dateOf(const WallClock& clock, TimeZone zone) {
+  const CalendarDate date = CalendarDate::fromFields(clock.fields, zone);
+  return Value(CalendarDate(date.instant(), std::move(zone), clock.nanoseconds));
 }
 
 std::string formatWallClock(const CalendarDate& date) {
@@ -134,10 +138,7 @@ Json zoneToJson(const TimeZone& zone) {
 TimeZone zoneFromJson(const Json& json, const Path& path) {
   if (json.is_string()) {
     const std::string name = json.get<std::string>();
-    if (name == "local") return TimeZone::local();
-    if (name == "GMT") return TimeZone::gmt();
-    if (name == "UTC") return TimeZone::utc();
-    if (auto zone = TimeZone::named(name)) return *zone;
+    if (auto zone = zoneNamed(name)) return *zone;
     fail(path, "unknown time zone " + jsonQuoted(name));
   }
   if (!json.is_object()) {
@@ -180,6 +181,19 @@ TimeZone zoneFromJson(const Json& json, const Path& path) {
 
 }  // namespace
 
+std::optional<TimeZone> zoneNamed(std::string_view name) {
+  if (name == "local") return TimeZone::local();
+  if (name == "GMT") return TimeZone::gmt();
+  if (name == "UTC") return TimeZone::utc();
+  return TimeZone::named(name);
+}
+
+std::optional<Value> dateValue(std::string_view wallClock, TimeZone zone) {
+  const std::optional<WallClock> clock = parseWallClock(wallClock, nullptr);
+  if (!clock) return std::nullopt;
+  return dateOf(*clock, std::move(zone));
+}
+
 Json dateToJson(const CalendarDate& date) {
   Json out = Json::object();
   out["$date"] = formatWallClock(date);
@@ -220,14 +234,10 @@ Value typedValueFromJson(const Json& json, const Path& path) {
   if (json.contains("$date")) {
     onlyKeys({"$date", "tz"}, "$date");
     std::string why;
-    auto clock = parseWallClock(stringAt("$date"), why);
+    auto clock = parseWallClock(stringAt("$date"), &why);
     if (!clock) fail(path.child("$date"), why);
     if (!json.contains("tz")) fail(path, "a date needs its time zone \"tz\"");
-    TimeZone zone = zoneFromJson(json.at("tz"), path.child("tz"));
-    // A wall-clock time shown twice (autumn fold) reads as its earlier instant; the typed
-    // form has no offset to say otherwise.
-    const CalendarDate date = CalendarDate::fromFields(clock->fields, zone);
-    return Value(CalendarDate(date.instant(), std::move(zone), clock->nanoseconds));
+    return dateOf(*clock, zoneFromJson(json.at("tz"), path.child("tz")));
   }
   for (const auto& [key, item] : json.items()) {
     if (!key.empty() && key.front() == '$') {

@@ -78,8 +78,17 @@ LinkIndexer::LinkIndexer(Connection& connection) : connection_(connection) {
   if (largest.step() && !largest.isNull(0)) largestOldKey_ = largest.integer(0);
 }
 
+bool LinkIndexer::firstTouch(std::int64_t key) {
+  if (key > largestOldKey_) {
+    if (key <= largestNewKey_) return false;
+    largestNewKey_ = key;
+    return true;
+  }
+  return touched_.insert(key).second;
+}
+
 void LinkIndexer::forget(std::int64_t key) {
-  if (!touched_.insert(key).second) {
+  if (!firstTouch(key)) {
     // Written twice in one transaction: the first version's entries may still wait.
     std::erase_if(pending_, [key](const auto& link) { return link.second == key; });
   }
@@ -132,6 +141,8 @@ void LinkIndexer::flush() {
   }
   pending_.clear();
   touched_.clear();
+  // The records added so far have their entries in the table now.
+  largestOldKey_ = std::max(largestOldKey_, largestNewKey_);
 }
 
 std::vector<Record> recordsWithoutLinksTo(Connection& connection,

@@ -36,10 +36,17 @@ class LinkIndexer {
 
  private:
   void forget(std::int64_t key);
+  // Whether the record under `key` is met for the first time since the last flush().
+  bool firstTouch(std::int64_t key);
   Connection& connection_;
+  // Keys up to this one may have entries in the table.
   std::int64_t largestOldKey_ = 0;
+  // SQLite gives each added row a key above every key in the table, so the records added
+  // since the last flush() are known by the largest key among them, with no set to fill.
+  std::int64_t largestNewKey_ = 0;
   // (target, source) pairs waiting for flush().
   std::vector<std::pair<std::int64_t, std::int64_t>> pending_;
+  // Records at or below largestOldKey_ met since the last flush().
   std::unordered_set<std::int64_t> touched_;
 };
 

@@ -22,18 +22,26 @@ Statement& Statement::bind(int index, std::int64_t value) {
   return *this;
 }
 
-Statement& Statement::bind(int index, std::string_view text) {
-  int rc = sqlite3_bind_text64(statement_, index, text.data(), text.size(), SQLITE_TRANSIENT,
+namespace {
+
+sqlite3_destructor_type destructorFor(Lifetime lifetime) {
+  return lifetime == Lifetime::UntilReset ? SQLITE_STATIC : SQLITE_TRANSIENT;
+}
+
+}  // namespace
+
+Statement& Statement::bind(int index, std::string_view text, Lifetime lifetime) {
+  int rc = sqlite3_bind_text64(statement_, index, text.data(), text.size(), destructorFor(lifetime),
                                SQLITE_UTF8);
   if (rc != SQLITE_OK) connection_.fail(rc, "binding");
   return *this;
 }
 
-Statement& Statement::bindBlob(int index, std::span<const std::uint8_t> bytes) {
+Statement& Statement::bindBlob(int index, std::span<const std::uint8_t> bytes, Lifetime lifetime) {
   // A zero-length blob must stay a blob, not become NULL.
   int rc = bytes.empty() ? sqlite3_bind_zeroblob(statement_, index, 0)
                          : sqlite3_bind_blob64(statement_, index, bytes.data(), bytes.size(),
-                                               SQLITE_TRANSIENT);
+                                               destructorFor(lifetime));
   if (rc != SQLITE_OK) connection_.fail(rc, "binding");
   return *this;
 }

@@ -11,6 +11,11 @@ namespace tessel::detail {
 
 class Connection;
 
+// How long the text or bytes given to a bind stay as they are. Copied: SQLite copies them.
+// UntilReset: they outlive the statement's next reset (run() resets), and SQLite reads them in
+// place, which spares a copy of every record a bulk write binds.
+enum class Lifetime { Copied, UntilReset };
+
 // One prepared SQLite statement. Bind indexes start at 1, column indexes at 0. Failures raise
 // TesselStoreException with SQLite's message.
 class Statement {
@@ -21,8 +26,9 @@ class Statement {
   Statement& operator=(const Statement&) = delete;
 
   Statement& bind(int index, std::int64_t value);
-  Statement& bind(int index, std::string_view text);
-  Statement& bindBlob(int index, std::span<const std::uint8_t> bytes);
+  Statement& bind(int index, std::string_view text, Lifetime lifetime = Lifetime::Copied);
+  Statement& bindBlob(int index, std::span<const std::uint8_t> bytes,
+                      Lifetime lifetime = Lifetime::Copied);
   Statement& bindNull(int index);
 
   // Advances; true while a row is available.

@@ -11,6 +11,7 @@
 #include <string>
 #include <vector>
 
+#include "importers/import_warnings.h"
 #include "importers/stable_hash.h"
 #include "support/files.h"
 #include "support/scoped_environment.h"
@@ -31,13 +32,13 @@ const fs::path kData = fs::path(ZT_TEST_DATA_DIR) / "data" / "ical";
 
 using zt::test_support::readFile;
 
-ICalCalendar readText(const std::string& text, std::optional<std::string> title = std::nullopt) {
+// Read with OnFault::Refuse, or with `warnings`.
+ICalCalendar readText(const std::string& text, ImportWarnings* warnings = nullptr) {
   ICalCalendarSource source;
   source.identifier = "cal";
   source.files.push_back({"test.ics", text});
-  source.title = std::move(title);
   source.fallbackTitle = "fallback";
-  return readICalCalendar(source);
+  return warnings != nullptr ? readICalCalendar(source, *warnings) : readICalCalendar(source);
 }
 
 ICalCalendar readDataFile(const std::string& name) {
@@ -61,9 +62,11 @@ std::string calendarText(const std::string& body) {
 // only by their VTIMEZONE (a southern-hemisphere daylight rule, one that ended), vendor
 // prefixes before IANA names, floating times, and tasks with "/" and "#" in their UID; and
 // habits.ics: LF or CR line ends, a byte order mark, a fold inside a UTF-8 character, blank
-// lines, empty values and libical's own X-LIC-ERROR remarks.
+// lines, empty values and libical's own X-LIC-ERROR remarks; phone_1_0.vcs: vCalendar 1.0's
+// quoted-printable Latin-1, recurrence grammar, alarms, lists and status words.
 TEST(ICalImportReading, EachExportBecomesTheRecordsOfItsReferenceFile) {
-  for (const char* source : {"outlook.ics", "google.ics", "custom_zone.ics", "habits.ics"}) {
+  for (const char* source :
+       {"outlook.ics", "google.ics", "custom_zone.ics", "habits.ics", "phone_1_0.vcs"}) {
     SCOPED_TRACE(source);
     const ICalCalendar calendar = readDataFile(source);
     std::string lines = "title " + calendar.title + ", " + std::to_string(calendar.eventCount) +
@@ -107,16 +110,16 @@ TEST(ICalImportReading, NothingIsLostInSilence) {
       {alarm + "DTSTART:20260301T100000Z\r\nBEGIN:VALARM\r\nTRIGGER:-PT5M\r\nEND:VALARM\r\n"
                "BEGIN:VALARM\r\nACTION:NONE\r\nTRIGGER:-PT1M\r\nEND:VALARM\r\nEND:VEVENT\r\n",
        "cal/event/e", R"("display alarms":["cal/event/e#alarm1"],)",
-       "test.ics:7: VALARM without ACTION: read as a display alarm\n"},
+       "test.ics: line 7: VALARM without ACTION: read as a display alarm\n"},
       {alarm + "BEGIN:VALARM\r\nACTION:PROCEDURE\r\nTRIGGER:-PT5M\r\nEND:VALARM\r\n"
                "BEGIN:VALARM\r\nACTION:DISPLAY\r\nEND:VALARM\r\nEND:VEVENT\r\n",
        "cal/event/e#alarm1", "(absent",
-       "test.ics:7: VALARM: ACTION:PROCEDURE is not an alarm: dropped\n"
-       "test.ics:10: VALARM without TRIGGER: dropped\n"},
+       "test.ics: line 7: VALARM: ACTION:PROCEDURE is not an alarm: dropped\n"
+       "test.ics: line 10: VALARM without TRIGGER: dropped\n"},
       // Of two DTSTART lines the first counts.
       {alarm + "DTSTART:20260301T100000Z\r\nDTSTART:20260302T100000Z\r\nEND:VEVENT\r\n",
        "cal/event/e", R"("start date":{"$date":"2026-03-01T10:00:00")",
-       "test.ics:7: a second DTSTART: ignored\n"},
+       "test.ics: line 7: a second DTSTART: ignored\n"},
       // Without UID, what the event says is its identity: two that differ stay two.
       {noUid + "END:VEVENT\r\n" + noUid + "DESCRIPTION:Green\r\nEND:VEVENT\r\n", "cal",
        R"("events":["cal/event/no-uid-)", "", 2},
@@ -125,17 +128,17 @@ TEST(ICalImportReading, NothingIsLostInSilence) {
        "BEGIN:VEVENT\r\nUID:a\r\nSUMMARY:new\r\nEND:VEVENT\r\n"
        "BEGIN:VEVENT\r\nUID:a\r\nSUMMARY:new\r\nDTSTAMP:20260101T000000Z\r\nEND:VEVENT\r\n",
        "cal", R"("events":["cal/event/a","cal/event/a/copy-)",
-       "test.ics:9: UID a is given twice: kept as a second event\n", 2},
+       "test.ics: line 9: UID a is given twice: kept as a second event\n", 2},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.body);
-    ::testing::internal::CaptureStderr();
-    const ICalCalendar calendar = readText(calendarText(c.body));
-    std::string warnings = ::testing::internal::GetCapturedStderr();
-    for (std::size_t at; (at = warnings.find("tessel: warning: ")) != std::string::npos;)
-      warnings.erase(at, 17);
+    // Nothing here is a fault: with OnFault::Refuse too, the warnings are only said.
+    ImportWarnings warnings(OnFault::Refuse);
+    const ICalCalendar calendar = readText(calendarText(c.body), &warnings);
+    std::string said;
+    for (const ImportWarning& warning : warnings.all()) said += warningText(warning) + "\n";
     EXPECT_CONTAINS(json(calendar, c.id), c.holds);
-    EXPECT_EQ(warnings, c.warnings);
+    EXPECT_EQ(said, c.warnings);
     EXPECT_EQ(calendar.eventCount, c.events);
   }
   // Read again, also with lines added before them, events without UID keep their
@@ -149,17 +152,35 @@ TEST(ICalImportReading, NothingIsLostInSilence) {
   EXPECT_EQ(again.title, "Named");
 }
 
-// Every file of malformed/ is refused with its line and reason, compared with
+// Every file of malformed/, after a good file: with OnFault::Refuse, refused with its line and
+// reason; with OnFault::Skip, what is kept and each warning. Compared with
 // golden/ical/malformed.txt.
-TEST(ICalImportReading, MalformedInputNamesFileAndLine) {
+TEST(ICalImportReading, MalformedInputCostsWhatCannotBeReadOrWithRefuseEverything) {
   std::string faults;
+  const auto line = [](std::optional<std::size_t> number) {
+    return "line " + std::to_string(number.value_or(0)) + ": ";
+  };
   for (const std::string& name : zt::test_support::namesIn(kData / "malformed")) {
+    const std::vector<fs::path> paths = {kData / "outlook.ics", kData / "malformed" / name};
     try {
-      readICalendarPaths({kData / "outlook.ics", kData / "malformed" / name});
+      readICalendarPaths(paths);
       faults += name + ": accepted\n";
     } catch (const ImportError& e) {
       EXPECT_EQ(e.source(), (kData / "malformed" / name).string());
-      faults += name + ": line " + std::to_string(e.line().value_or(0)) + ": " + e.reason() + "\n";
+      faults += name + ": " + line(e.line()) + e.reason() + "\n";
+    }
+    ImportWarnings warnings(OnFault::Skip);
+    try {
+      const std::vector<ICalCalendar> read =
+          readICalendarPaths(parseICalendarPaths(paths, warnings), {}, {}, warnings);
+      faults += "  kept " + std::to_string(read.back().eventCount) + " events, " +
+                std::to_string(read.back().taskCount) + " tasks\n";
+    } catch (const ImportError& e) {
+      faults += "  refused: " + line(e.line()) + e.reason() + "\n";
+    }
+    for (const ImportWarning& warning : warnings.all()) {
+      EXPECT_EQ(warning.source, (kData / "malformed" / name).string());
+      faults += "  warning: " + line(warning.line) + warning.message + "\n";
     }
   }
   EXPECT_TRUE(zt::test_support::matchesGoldenFile(

@@ -91,18 +91,35 @@ TEST(VCardImportContent, IdentifiersWithoutUidAreStable) {
 
 // --- Malformed input -------------------------------------------------------------------
 
-// Every file of malformed/ is refused, after a good folder, with its file, line and reason,
-// compared with golden/vcard/malformed.txt.
-TEST(VCardImportMalformed, EachFaultNamesFileLineAndReason) {
+// Every file of malformed/, after a good folder: with OnFault::Refuse, refused with its file,
+// line and reason; with OnFault::Skip, what is kept and each warning. Compared with
+// golden/vcard/malformed.txt.
+TEST(VCardImportMalformed, EachFaultCostsWhatCannotBeReadOrWithRefuseEverything) {
   std::string faults;
+  const auto line = [](std::optional<std::size_t> number) {
+    return "line " + std::to_string(number.value_or(0)) + ": ";
+  };
   for (const std::string& name : zt::test_support::namesIn(kData / "malformed")) {
+    const std::vector<fs::path> paths = {kData / "vdir", kData / "malformed" / name};
     VCardImport import;
     try {
-      import.addPaths({kData / "vdir", kData / "malformed" / name});
+      import.addPaths(paths);
       faults += name + ": accepted\n";
     } catch (const ImportError& e) {
       EXPECT_EQ(e.source(), (kData / "malformed" / name).string());
-      faults += name + ": line " + std::to_string(e.line().value_or(0)) + ": " + e.reason() + "\n";
+      faults += name + ": " + line(e.line()) + e.reason() + "\n";
+    }
+    ImportWarnings warnings(OnFault::Skip);
+    VCardImport lenient(warnings);
+    try {
+      lenient.addPaths(paths);
+      faults += "  kept " + std::to_string(lenient.contactCount()) + " contacts\n";
+    } catch (const ImportError& e) {
+      faults += "  refused: " + line(e.line()) + e.reason() + "\n";
+    }
+    for (const ImportWarning& warning : warnings.all()) {
+      EXPECT_EQ(warning.source, (kData / "malformed" / name).string());
+      faults += "  warning: " + line(warning.line) + warning.message + "\n";
     }
   }
   EXPECT_TRUE(zt::test_support::matchesGoldenFile(

@@ -59,6 +59,31 @@ TEST(RecordJsonRoundTrip, TypedValuesWriteBackAsTheyWereRead) {
   EXPECT_TRUE(summer.asDate()->isSameInstant(dateIn(TimeZone::gmt(), {2007, 7, 1, 8, 0, 0})));
 }
 
+// A line of JSON Lines reads as the same record as its text read whole: the quick scanner that
+// takes the common lines and the thorough reader that takes the others agree.
+TEST(RecordJsonRoundTrip, LinesReadAsTheirTextReadWhole) {
+  for (
+      const char* json : {
+          R"({"id":"a","record":{"tessel.record.entity":"e","n":-0,"m":-12,"r":1.5e-3,"b":true)"
+          R"(,"f":false,"big":123456789012345678,"x":1E2}})",
+          R"( {"record" : {"tessel.record.entity" : "e" , "l" : [ ] , "d" : { } } , "id" : "b" } )",
+          R"({"id":"c\"\\\/\b\f\n\r\t\u00e9\ud83d\ude00","record":{"tessel.record.entity":"é😀"}})",
+          R"({"id":"d","record":{"tessel.record.entity":"e","k\u0065y":1,"h":1234567890123456789012}})",
+          R"({"id":"f","record":{"tessel.record.entity":"e","a":[[1,[2]],{"b":"c"}],"s":"x\ty"}})",
+          R"({"id":"e","record":{"tessel.record.entity":"e","u":{"$url":"http://x/"},)"
+          R"("i":{"$data":"Zg=="},"w":[{"tz":"Europe/Paris","$date":"2007-03-15T12:30:00.5"},)"
+          R"({"$date":"2030-01-02T03:04","tz":"local"},{"$date":"2007-03-15T12:30:00","tz":"UTC"}]}})",
+          R"({"id":"g","record":{"tessel.record.entity":"e",)"
+          R"("w":{"$date":"2007-07-01T10:00","tz":{"std":3600,"dst":7200,"rule":"M3.5.0,M10.5.0/3"}}}})",
+      }) {
+    const std::vector<Record> records = parseRecordLines(json);
+    const Dictionary whole = recordFromJson(json);
+    ASSERT_EQ(records.size(), 1u);
+    EXPECT_EQ(records[0].id, *whole.stringAt("id")) << json;
+    EXPECT_EQ(records[0].record, *whole.dictionaryAt("record")) << json;
+  }
+}
+
 TEST(RecordJsonErrors, EachFaultNamesThePathAndWhatIsWrong) {
   const auto date = [](const std::string& text) {
     return R"({"start date":{"$date":)" + text + R"(,"tz":"UTC"}})";
@@ -107,6 +132,21 @@ TEST(RecordJsonErrors, JsonLinesNameTheLine) {
       {R"({"id":"b","record":{"first name":"Ada"}})", "record", "no entity name"},
       {R"({"id":"b","record":{"tessel.record.entity":"e"})", "", "invalid JSON"},
       {R"({"id":"a","record":{"tessel.record.entity":"e"}})", "id", "already given on line 1"},
+      {R"({"id":"b","record":{"tessel.record.entity":"e","n":01}})", "", "invalid JSON"},
+      {R"({"id":"b","record":{"tessel.record.entity":"e","n":1.}})", "", "invalid JSON"},
+      {R"({"id":"b","record":{"tessel.record.entity":"e","n":-}})", "", "invalid JSON"},
+      {R"({"id":"b","record":{"tessel.record.entity":"e","n":1e999}})", "", "number overflow"},
+      {R"({"id":"b","record":{"tessel.record.entity":"e","n":null}})", "record.n", "null"},
+      {R"({"id":"b","record":{"tessel.record.entity":"e","n":tru}})", "", "invalid JSON"},
+      {R"({"id":"b","record":{"tessel.record.entity":"e","n":"\x"}})", "", "invalid JSON"},
+      {"{\"id\":\"b\",\"record\":{\"tessel.record.entity\":\"e\t\"}}", "", "invalid JSON"},
+      {"{\"id\":\"b\",\"record\":{\"tessel.record.entity\":\"e\xC0\x80\"}}", "", "invalid JSON"},
+      {R"({"id":"b","record":{"tessel.record.entity":"e"}} x)", "", "invalid JSON"},
+      {R"({"id":"b","id":"c","record":{"tessel.record.entity":"e"}})", "id", "twice"},
+      {R"({"id":"b","record":{"tessel.record.entity":""}})", R"(record."tessel.record.entity")",
+       "non-empty"},
+      {R"({"id":"b","record":{"tessel.record.entity":"e","d":{"$date":"2007-03-15T12:30","tz":"Mars"}}})",
+       "record.d.tz", "unknown time zone"},
   };
   for (const auto& [bad, path, reason] : cases) {
     const std::string lines = good + "\n\n" + bad + "\n" + good;

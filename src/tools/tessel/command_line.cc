@@ -18,6 +18,7 @@
 
 namespace tessel::cli {
 
+using importers::OnFault;
 using importers::SyncDeletes;
 
 void addStoreCommands(CLI::App& app, CommandLine& line) {
@@ -77,6 +78,7 @@ void addImportCommands(CLI::App& app, CommandLine& line) {
     std::vector<std::string> icalPaths;
     ICalImportChoices ical;
     bool icalSyncDeletes = false;
+    bool strict = false;
   };
   auto options = std::make_shared<Options>();
 
@@ -86,24 +88,27 @@ void addImportCommands(CLI::App& app, CommandLine& line) {
   auto* vcard = import->add_subcommand(
       "vcard",
       "vCard 2.1, 3.0 and 4.0 files, and folders of .vcf files (vdir); CATEGORIES become "
-      "groups. Nothing is imported unless every file is valid");
+      "groups. What cannot be read is left out with a warning, and the rest imported");
   vcard->add_option("PATH", options->vcardPaths, ".vcf files or folders")->required();
   vcard->add_flag("--sync-deletes", options->vcardSyncDeletes,
                   "Also delete the records of earlier vCard imports that this one does not "
                   "produce");
+  vcard->add_flag("--strict", options->strict,
+                  "Import nothing unless every file is valid: the first fault is an error");
   vcard->callback([&line, options] {
     line.command = [options](CommandContext& context) {
       importVCards(context, options->vcardPaths,
-                   options->vcardSyncDeletes ? SyncDeletes::On : SyncDeletes::Off);
+                   options->vcardSyncDeletes ? SyncDeletes::On : SyncDeletes::Off,
+                   options->strict ? OnFault::Refuse : OnFault::Skip);
     };
   });
 
   auto* ical = import->add_subcommand(
       "ical",
-      "iCalendar files and folders of .ics files (vdir), one calendar per file or folder. A "
-      "calendar imported before is found again by its X-WR-RELCALID, else by its title, also "
-      "when the file was moved or downloaded again under another name. Nothing is imported "
-      "unless every file is valid");
+      "iCalendar (and vCalendar 1.0) files and folders of .ics files (vdir), one calendar per "
+      "file or folder. A calendar imported before is found again by its X-WR-RELCALID, else by "
+      "its title, also when the file was moved or downloaded again under another name. What "
+      "cannot be read is left out with a warning, and the rest imported");
   ical->add_option("PATH", options->icalPaths, ".ics files or folders")->required();
   ical->add_option("--title", options->ical.title,
                    "Title of the calendars, over the one their files give (default: "
@@ -114,10 +119,13 @@ void addImportCommands(CLI::App& app, CommandLine& line) {
   ical->add_flag("--sync-deletes", options->icalSyncDeletes,
                  "Also delete the events and tasks of these calendars that this import does not "
                  "produce");
+  ical->add_flag("--strict", options->strict,
+                 "Import nothing unless every file is valid: the first fault is an error");
   ical->callback([&line, options] {
     line.command = [options](CommandContext& context) {
       importICalendars(context, options->icalPaths, options->ical,
-                       options->icalSyncDeletes ? SyncDeletes::On : SyncDeletes::Off);
+                       options->icalSyncDeletes ? SyncDeletes::On : SyncDeletes::Off,
+                       options->strict ? OnFault::Refuse : OnFault::Skip);
     };
   });
 }

@@ -2,7 +2,9 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <cstdint>
 #include <cstring>
+#include <filesystem>
 #include <fstream>
 #include <iterator>
 #include <ostream>
@@ -37,7 +39,16 @@ std::string readInput(CommandContext& context, const std::string& file) {
   }
   std::ifstream in(file, std::ios::binary);
   if (!in) throw std::runtime_error("cannot read " + file + ": " + std::strerror(errno));
-  return readAll(in, file);
+  // A regular file is read in one piece at its size; anything else (a pipe) as it comes.
+  const std::uintmax_t size = std::filesystem::file_size(file, error);
+  if (error || size == 0) return readAll(in, file);
+  std::string text(size, '\0');
+  in.read(text.data(), static_cast<std::streamsize>(size));
+  if (in.bad()) throw std::runtime_error("cannot read " + file);
+  text.resize(static_cast<std::size_t>(in.gcount()));
+  // A file that grew while being read: the rest as it comes.
+  if (!in.eof()) text += readAll(in, file);
+  return text;
 }
 
 }  // namespace

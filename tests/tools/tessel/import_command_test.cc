@@ -73,26 +73,36 @@ TEST_F(ImportCommand, SyncDeletesAndTitles) {
   run = tessel({"import", "ical", (dir_ / "w.ics").string(), "--calendar", "Team"});
   EXPECT_CONTAINS(run.out, "\"Team Plans\": 1 event, 0 tasks\n");
   EXPECT_CONTAINS(run.err, "\ntessel: warning: " + (dir_ / "w.ics").string() +
-                               ":5: VALARM without ACTION: read as a display alarm\n");
+                               ": line 5: VALARM without ACTION: read as a display alarm\n");
   EXPECT_EQ(tessel({"calendars", "list"}).out.find("Work"), std::string::npos);
 }
 
-TEST_F(ImportCommand, FaultsImportNothingAndUsageErrorsExitWithTwo) {
+// A fault costs what cannot be read, with a warning and the count in the summary; with
+// --strict it costs the whole import, as does a file of the wrong kind either way.
+TEST_F(ImportCommand, FaultsCostWhatCannotBeReadOrWithStrictEverything) {
   ASSERT_EQ(tessel({"import", "vcard", (kData / "vcard" / "vdir").string()}).status, 0);
   const std::string before = listJson();
-  const fs::path bad = kData / "vcard" / "malformed" / "bad_qp.vcf";
-  Outcome run = tessel({"import", "vcard", "--sync-deletes",
-                        (kData / "vcard" / "server_40.vcf").string(), bad.string()});
-  EXPECT_EQ(run.status, 1);
-  EXPECT_EQ(run.err, "tessel: " + bad.string() + ": line 4: bad quoted-printable in NOTE\n");
-  EXPECT_EQ(run.out, "");
+  const std::string good = (kData / "vcard" / "server_40.vcf").string();
+  const std::string bad = (kData / "vcard" / "malformed" / "bad_qp.vcf").string();
+  const std::string fault = bad + ": line 4: bad quoted-printable in NOTE";
   writeFile(dir_ / "bad.ics",
             "BEGIN:VCALENDAR\r\nBEGIN:VEVENT\r\nUID:b\r\n"
             "DTSTART;TZID=Nowhere/Unknown:20260101T100000\r\nEND:VEVENT\r\nEND:VCALENDAR\r\n");
-  run = tessel(
-      {"import", "ical", (kData / "ical" / "outlook.ics").string(), (dir_ / "bad.ics").string()});
+  const std::string ics = (dir_ / "bad.ics").string();
+  const std::string outlook = (kData / "ical" / "outlook.ics").string();
+  Outcome run = tessel({"import", "vcard", "--strict", "--sync-deletes", good, bad});
+  EXPECT_EQ(run.status, 1);
+  EXPECT_EQ(run.err, "tessel: " + fault + "\n");
+  EXPECT_EQ(run.out, "");
+  run = tessel({"import", "ical", "--strict", outlook, ics});
   EXPECT_EQ(run.status, 1);
   EXPECT_CONTAINS(run.err, "bad.ics: line 4: DTSTART: no VTIMEZONE defines the time zone");
+  // A file of the other kind, or that is no file, imports nothing either way.
+  run = tessel({"import", "ical", outlook, good});
+  EXPECT_EQ(run.err, "tessel: " + good + ": this is a vCard file: use tessel import vcard\n");
+  run = tessel({"import", "vcard", good, outlook});
+  EXPECT_EQ(run.err,
+            "tessel: " + outlook + ": this is an iCalendar file: use tessel import ical\n");
   run = tessel({"import", "ical", (dir_ / "none.ics").string()});
   EXPECT_EQ(run.err, "tessel: " + (dir_ / "none.ics").string() + ": no such file or folder\n");
   EXPECT_EQ(tessel({"import", "vcard", (dir_ / "nowhere.vcf").string()}).status, 1);
@@ -108,6 +118,16 @@ TEST_F(ImportCommand, FaultsImportNothingAndUsageErrorsExitWithTwo) {
   EXPECT_EQ(run.status, 2);
   EXPECT_CONTAINS(run.err, "\"Nope\" is not a calendar of the store");
   EXPECT_EQ(listJson(), before);
+
+  run = tessel({"import", "vcard", good, bad});
+  EXPECT_EQ(run.status, 0);
+  EXPECT_CONTAINS(run.err,
+                  "tessel: warning: " + fault + "; dropped the NOTE of the card \"B A\"\n");
+  EXPECT_CONTAINS(run.out, " deleted; 1 warning\n");
+  run = tessel({"import", "ical", ics});
+  EXPECT_EQ(run.status, 0);
+  EXPECT_CONTAINS(run.err, "as a floating time\n");
+  EXPECT_CONTAINS(run.out, "\"bad\": 1 event, 0 tasks\n");
 
   EXPECT_EQ(tessel({"import", "vcard"}).status, 2);
   EXPECT_EQ(tessel({"import", "vcard", "--no-such-flag", "x.vcf"}).status, 2);
