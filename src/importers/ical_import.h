@@ -37,6 +37,7 @@ struct ICalImportTarget {
 // One path of an import, parsed: its files, and what its calendar's title may come from.
 struct ICalPath {
   std::string name;  // the path as the user wrote it
+  // The identifier that earlier versions gave the calendar of this path.
   std::string pathIdentifier;
   std::optional<std::string> sourceTitle;  // a folder's vdir "displayname" file
   std::string fallbackTitle;

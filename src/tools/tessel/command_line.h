@@ -27,5 +27,6 @@ void addClientCommands(CLI::App& app, CommandLine& line);    // client ..., clie
 void addSessionCommands(CLI::App& app, CommandLine& line);   // session cancel
 void addDefaultsCommands(CLI::App& app, CommandLine& line);  // defaults [set|unset]
 void addDeviceCommands(CLI::App& app, CommandLine& line);    // devices, watch, sync
+void addSourceCommands(CLI::App& app, CommandLine& line);    // source ..., refresh
 
 }  // namespace tessel::cli

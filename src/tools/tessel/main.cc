@@ -50,6 +50,7 @@ int main(int argc, char** argv) {
   addSessionCommands(app, line);
   addDeviceCommands(app, line);
   addDefaultsCommands(app, line);
+  addSourceCommands(app, line);
 
   try {
     app.parse(argc, argv);

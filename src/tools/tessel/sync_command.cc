@@ -17,11 +17,13 @@
 #include "tessel/client.h"
 #include "tessel/exception.h"
 #include "tessel/schema.h"
+#include "tools/tessel/counted.h"
 #include "tools/tessel/device_commands.h"
 #include "tools/tessel/notification_file.h"
 #include "tools/tessel/player_contents.h"
 #include "tools/tessel/progress_file.h"
 #include "tools/tessel/progress_view.h"
+#include "tools/tessel/refresh_command.h"
 #include "tools/tessel/sync_outcome.h"
 
 namespace tessel::cli {
@@ -32,12 +34,12 @@ namespace fs = std::filesystem;
 using zt::platform::Result;
 
 // The sources are brought in before any player is synced, so that a player plugged in gets
-// what the servers and folders hold today; the error says which could not be read.
-// MERGE: the one call of the refresh of `tessel refresh` (refresh_command.h) goes here; until
-// it is wired there are no sources, and nothing to refresh.
+// what the servers and folders hold today. Each source that could not be read has said why on
+// standard error; the error counts them.
 Result<void> refreshBeforeSync(CommandContext& context) {
-  static_cast<void>(context);
-  return {};
+  const RefreshOutcome refreshed = refreshSources(context);
+  if (refreshed.ok()) return {};
+  return zt::platform::Error{counted(refreshed.failed, "source", "sources") + " could not be read"};
 }
 
 volatile std::sig_atomic_t interrupted = 0;

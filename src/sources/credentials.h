@@ -1,0 +1,16 @@
+#pragma once
+
+#include <filesystem>
+
+#include "platform/result.h"
+#include "sources/http_client.h"
+
+namespace tessel::sources {
+
+// Reads the user name and password of a source from its credentials file: one line,
+// "USER:PASSWORD" (the user name ends at the first colon, as RFC 7617 joins them). The file
+// must be readable by its owner only (chmod 600): a file that others can read is refused,
+// since its password is as good as published. Messages name the file, never its content.
+zt::platform::Result<BasicCredentials> readCredentials(const std::filesystem::path& file);
+
+}  // namespace tessel::sources
