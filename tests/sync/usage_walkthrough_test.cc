@@ -5,6 +5,7 @@
 #include <gtest/gtest.h>
 
 #include <fstream>
+#include <memory>
 #include <set>
 #include <sstream>
 #include <string>
@@ -13,6 +14,7 @@
 
 #include "support/files.h"
 #include "support/process.h"
+#include "support/radicale_server.h"
 #include "sync/synctool_fixture.h"
 
 namespace zt::sync::test_support {
@@ -63,6 +65,25 @@ class UsageWalkthrough : public SynctoolTest {
     setPlayers({player});
   }
 
+  // The page's server, dav.example.org, is a Radicale on 127.0.0.1 holding a calendar and an
+  // address book; its password is in the file the page has the person write.
+  void startServer() {
+    const fs::path credentials = home_ / ".config" / "tessel" / "dav";
+    fs::create_directories(credentials.parent_path());
+    zt::test_support::writeFile(credentials, "you:secret\n");
+    fs::permissions(credentials, fs::perms::owner_read | fs::perms::owner_write);
+    server_ = std::make_unique<zt::test_support::RadicaleServer>(folder() / "dav", credentials);
+    ASSERT_TRUE(server_->listening());
+    ASSERT_EQ(server_->makeCalendar("team"), "201");
+    ASSERT_EQ(server_->makeAddressBook("people"), "201");
+    ASSERT_EQ(
+        server_->request("PUT", "team/t1.ics", zt::test_support::eventText("t1", "Team lunch")),
+        "201");
+    ASSERT_EQ(server_->request("PUT", "people/p1.vcf",
+                               zt::test_support::cardText("p1", "Grace Hopper"), "text/vcard"),
+              "201");
+  }
+
   // The test's environment as a person's: the default store in the home folder, the installed
   // programs first on PATH, no session bus.
   std::map<std::string, std::string> personEnvironment() const {
@@ -83,9 +104,12 @@ class UsageWalkthrough : public SynctoolTest {
   }
 
   fs::path home_;
+  std::unique_ptr<zt::test_support::RadicaleServer> server_;
 };
 
 TEST_F(UsageWalkthrough, EveryCommandOfThePageRunsAndThePlayerEndsUpSynced) {
+  if (!zt::test_support::RadicaleServer::installed()) GTEST_SKIP() << "radicale is not installed";
+  startServer();
   std::string script = "set -e\ncd '" + kSource.string() + "'\n";
   std::set<std::string> skipped;
   for (std::string command : usageCommands()) {
@@ -96,6 +120,8 @@ TEST_F(UsageWalkthrough, EveryCommandOfThePageRunsAndThePlayerEndsUpSynced) {
     // The page's build folder is the one these tests were built in.
     if (const auto at = command.find("build/default"); at != std::string::npos)
       command.replace(at, 13, ZT_BUILD_DIR);
+    if (const auto at = command.find("https://dav.example.org/you/"); at != std::string::npos)
+      command.replace(at, 28, server_->home());
     script += "echo '>>> " + command.substr(0, command.find('\'')) + "'\n" + command + "\n";
   }
   EXPECT_EQ(skipped, kNotRunHere) << "a line of kNotRunHere left docs/USAGE.md";
@@ -113,7 +139,12 @@ TEST_F(UsageWalkthrough, EveryCommandOfThePageRunsAndThePlayerEndsUpSynced) {
   // tessel sync found the tool beside it, followed its progress to the end and said what the
   // player holds.
   EXPECT_CONTAINS(run.out, "zeto-A27001A2B3C4D [##############################] 100.0% done");
-  EXPECT_CONTAINS(run.out, "zeto-A27001A2B3C4D: synced: 30 contacts, 2 calendars\n");
+  EXPECT_CONTAINS(run.out, "zeto-A27001A2B3C4D: synced: 31 contacts, 3 calendars\n");
+  EXPECT_CONTAINS(zt::test_support::readFile(volume() / "Calendars/Tessel-Team.ics"),
+                  "SUMMARY:Team lunch\r\n");
+  EXPECT_CONTAINS(zt::test_support::utf8OfUtf16BigEndian(
+                      zt::test_support::readFile(volume() / "Contacts/Tessel.vcf")),
+                  "N:Grace Hopper;");
   EXPECT_CONTAINS(run.out, "AlwaysPushVCard = true\t# ");
   EXPECT_EQ(zt::test_support::readFile(home_ / ".config" / "zetosynctool" / "defaults.conf"),
             "AlwaysPushVCard = true\n");
