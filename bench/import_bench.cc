@@ -180,13 +180,13 @@ void libicalParse(const std::string& text) {
 }
 
 void icalRead(const fs::path& ics) {
-  auto calendars = readICalendarPaths({ics}, std::nullopt);
+  auto calendars = readICalendarPaths({ics});
   benchmark::DoNotOptimize(calendars);
 }
 
 void icalImport(const fs::path& ics, const fs::path& store) {
   auto opened = Store::open(store);
-  writeICalCalendars(*opened, readICalendarPaths({ics}, std::nullopt), SyncDeletes::Off);
+  writeICalCalendars(*opened, readICalendarPaths({ics}), SyncDeletes::Off);
 }
 
 void vcardRead(const fs::path& vcf) {

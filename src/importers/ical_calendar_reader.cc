@@ -3,6 +3,7 @@
 #include <libical/ical.h>
 
 #include <cstdint>
+#include <cstdlib>
 #include <map>
 #include <memory>
 #include <set>
@@ -34,6 +35,10 @@ using zt::platform::lowerAscii;
 using zt::platform::TimeZone;
 using zt::platform::Value;
 
+struct FreeText {
+  void operator()(char* text) const { std::free(text); }
+};
+
 // ----- identifiers: the calendar's, the component's UID and its RECURRENCE-ID ---------------
 
 std::string compactDate(const CalendarDate::Fields& f) {
@@ -42,6 +47,16 @@ std::string compactDate(const CalendarDate::Fields& f) {
 
 std::string compactDateTime(const CalendarDate::Fields& f) {
   return compactDate(f) + "T" + twoDigits(f.hour) + twoDigits(f.minute) + twoDigits(f.second);
+}
+
+// The identifier of one occurrence: its date, its time on the floating wall clock, or its
+// time in UTC.
+std::string occurrenceKey(const ReadDate& rid) {
+  if (rid.wholeDay) return compactDate(rid.date.fields());
+  if (rid.date.timeZone().isLocal()) return compactDateTime(rid.date.fields());
+  CalendarDate utc = rid.date;
+  utc.setTimeZone(TimeZone::utc());
+  return compactDateTime(utc.fields()) + "Z";
 }
 
 // Bytes that structure the record identifiers ("/" "#") or that would make them hard to type
@@ -60,6 +75,44 @@ std::string escapedUid(std::string_view uid) {
     }
   }
   return escaped;
+}
+
+// What a component says, for the identity of one that has no UID of its own: every property
+// and sub-component as written, but for DTSTAMP, which many writers set to the time of the
+// export, and the line marks of the reader.
+void appendContent(icalcomponent* component, std::string& out) {
+  if (const char* kind = icalcomponent_kind_to_string(icalcomponent_isa(component))) out += kind;
+  out += '\n';
+  for (icalproperty* property : propertiesOf(component)) {
+    const char* name = icalproperty_get_property_name(property);
+    if (name == nullptr || ICalDocument::isLineMark(name)) continue;
+    if (icalproperty_isa(property) == ICAL_DTSTAMP_PROPERTY) continue;
+    out += name;
+    for (icalparameter* parameter = icalproperty_get_first_parameter(property, ICAL_ANY_PARAMETER);
+         parameter != nullptr;
+         parameter = icalproperty_get_next_parameter(property, ICAL_ANY_PARAMETER)) {
+      const char* xname = icalparameter_get_xname(parameter);
+      if (icalparameter_isa(parameter) == ICAL_X_PARAMETER && xname != nullptr &&
+          ICalDocument::isLineMark(xname)) {
+        continue;
+      }
+      std::unique_ptr<char, FreeText> text(icalparameter_as_ical_string_r(parameter));
+      out += ';';
+      if (text) out += text.get();
+    }
+    out += ':';
+    out += valueText(property);
+    out += '\n';
+  }
+  for (icalcomponent* inner : componentsOf(component, ICAL_ANY_COMPONENT)) {
+    appendContent(inner, out);
+  }
+}
+
+std::string contentHash(icalcomponent* component) {
+  std::string content;
+  appendContent(component, content);
+  return stableHash(content);
 }
 
 // ----- the calendar: its events and tasks, each followed by its sub-records ---------------
@@ -94,28 +147,20 @@ struct Related {
 
 class CalendarBuilder {
  public:
-  CalendarBuilder(ICalCalendarSource& source, ImportWarnings& warnings)
-      : source_(source), warnings_(warnings) {}
+  CalendarBuilder(ICalParsedFiles& files, std::string identifier, std::string title,
+                  ImportWarnings& warnings)
+      : files_(files),
+        identifier_(std::move(identifier)),
+        title_(std::move(title)),
+        warnings_(warnings) {}
 
   ICalCalendar build() {
-    std::vector<ICalDocument> documents;
-    documents.reserve(source_.files.size());
-    for (ICalFile& file : source_.files) {
-      documents.push_back(ICalDocument::parse(file.text, file.name, warnings_));
-      std::string().swap(file.text);  // libical holds what is needed of it
-    }
-
     ICalCalendar calendar;
-    calendar.identifier = source_.identifier;
-    std::optional<std::string> namedTitle;
-    for (const ICalDocument& document : documents) {
-      for (icalcomponent* vcalendar : document.calendars()) {
-        collect(document, vcalendar, namedTitle);
-      }
+    calendar.identifier = identifier_;
+    calendar.title = title_;
+    for (const ICalDocument& document : files_.documents) {
+      for (icalcomponent* vcalendar : document.calendars()) collect(document, vcalendar);
     }
-    calendar.title = source_.title ? *source_.title
-                     : namedTitle  ? *namedTitle
-                                   : source_.fallbackTitle;
     linkOverrides();
 
     Dictionary calendarRecord{{TesselRecordEntityNameKey, Value(TesselEntity_Calendars_Calendar)},
@@ -146,17 +191,8 @@ class CalendarBuilder {
   }
 
  private:
-  void collect(const ICalDocument& document, icalcomponent* vcalendar,
-               std::optional<std::string>& namedTitle) {
+  void collect(const ICalDocument& document, icalcomponent* vcalendar) {
     auto zones = std::make_shared<ICalTimeZones>(vcalendar);
-    for (icalproperty* property : propertiesOf(vcalendar)) {
-      if (namedTitle || icalproperty_isa(property) != ICAL_X_PROPERTY) continue;
-      const char* name = icalproperty_get_x_name(property);
-      // X-WR-CALNAME: the calendar's name as Apple, Google and Outlook export it.
-      if (name != nullptr && lowerAscii(name) == "x-wr-calname") {
-        namedTitle = text(icalproperty_get_x(property));
-      }
-    }
     for (icalcomponent* component : componentsOf(vcalendar, ICAL_ANY_COMPONENT)) {
       const icalcomponent_kind kind = icalcomponent_isa(component);
       if (kind != ICAL_VEVENT_COMPONENT && kind != ICAL_VTODO_COMPONENT) continue;
@@ -169,15 +205,19 @@ class CalendarBuilder {
                 {},
                 {}};
       ComponentReader reader(document, *zones, component);
-      std::string fallback;
+      icalproperty* uidProperty = nullptr;
       bool unreadable = false;
       for (icalproperty* property : propertiesOf(component)) {
         switch (icalproperty_isa(property)) {
           case ICAL_UID_PROPERTY:
-            if (const char* uid = icalproperty_get_uid(property)) item.uid = uid;
+            if (const char* uid = icalproperty_get_uid(property); uid != nullptr && !uidProperty) {
+              item.uid = uid;
+              uidProperty = property;
+            }
             break;
           case ICAL_RECURRENCEID_PROPERTY:
             // Which occurrence a component replaces is what it is: without it, it is dropped.
+            if (item.recurrenceId) break;
             try {
               item.recurrenceId = reader.date(property, icalproperty_get_recurrenceid(property));
             } catch (const ImportError& fault) {
@@ -185,41 +225,47 @@ class CalendarBuilder {
               unreadable = true;
             }
             break;
-          case ICAL_DTSTART_PROPERTY:
-          case ICAL_SUMMARY_PROPERTY:
-            fallback += valueText(property) + "\n";
-            break;
           default:
             break;
         }
       }
       if (unreadable) continue;
-      std::string identifier =
-          source_.identifier + (item.kind == ItemKind::Event ? "/event/" : "/task/");
+      std::string identifier = identifier_ + (item.kind == ItemKind::Event ? "/event/" : "/task/");
       // RFC 5545 section 3.8.4.7 wants a UID in every component; for the few exporters that
-      // leave it out, what the component says stands in, which stays stable while it does.
-      identifier += item.uid.empty() ? "no-uid-" + stableHash(fallback) : escapedUid(item.uid);
-      if (item.recurrenceId) {
-        const ReadDate& rid = *item.recurrenceId;
-        identifier += "/";
-        if (rid.wholeDay) {
-          identifier += compactDate(rid.date.fields());
-        } else if (rid.date.timeZone().isLocal()) {
-          identifier += compactDateTime(rid.date.fields());
-        } else {
-          CalendarDate utc = rid.date;
-          utc.setTimeZone(TimeZone::utc());
-          identifier += compactDateTime(utc.fields()) + "Z";
+      // leave it out, what the component says stands in: two that say different things stay
+      // two, and the same file read again gives the same identifiers.
+      identifier += item.uid.empty() ? "no-uid-" + contentHash(component) : escapedUid(item.uid);
+      if (item.recurrenceId) identifier += "/" + occurrenceKey(*item.recurrenceId);
+      item.identifier = std::move(identifier);
+      add(std::move(item), reader, uidProperty);
+    }
+  }
+
+  // RFC 5545 section 3.8.4.7 makes a UID unique, yet calendars merged by hand or folders with
+  // conflict copies hold the same UID twice. Both are kept, the later one as a copy known by
+  // what it says, unless it says the same. Of two overrides of one occurrence the later one
+  // counts.
+  void add(Item item, const ComponentReader& reader, icalproperty* uidProperty) {
+    auto known = positions_.find(item.identifier);
+    if (known != positions_.end() && !item.recurrenceId && !item.uid.empty()) {
+      const std::string hash = contentHash(item.component);
+      if (hash != contentHash(items_[known->second].component)) {
+        item.identifier += "/copy-" + hash;
+        known = positions_.find(item.identifier);
+        if (known == positions_.end()) {
+          reader.warn(uidProperty, "UID " + item.uid + " is given twice: kept as a second " +
+                                       (item.kind == ItemKind::Event ? "event" : "task"));
         }
       }
-      item.identifier = std::move(identifier);
-      // A component given twice (in two files of a folder, say) is read once: the later one.
-      auto [it, inserted] = positions_.emplace(item.identifier, items_.size());
-      if (inserted) {
-        items_.push_back(std::move(item));
-      } else {
-        items_[it->second] = std::move(item);
-      }
+    } else if (known != positions_.end() && item.recurrenceId && !item.uid.empty()) {
+      reader.warn(uidProperty,
+                  "UID " + item.uid + " overrides the same occurrence twice: the later one counts");
+    }
+    if (known == positions_.end()) {
+      positions_.emplace(item.identifier, items_.size());
+      items_.push_back(std::move(item));
+    } else {
+      items_[known->second] = std::move(item);
     }
   }
 
@@ -308,8 +354,7 @@ class CalendarBuilder {
     setRelationship(TesselRelationship_Calendars_Event_Organizer, related.organizer);
     setRelationship(TesselRelationship_Calendars_Event_Attendees, related.attendees);
     setRelationship(TesselRelationship_Calendars_Event_DetachedEvents, item.detached);
-    record.set(TesselRelationship_Calendars_Event_Calendar,
-               Value(relationship({source_.identifier})));
+    record.set(TesselRelationship_Calendars_Event_Calendar, Value(relationship({identifier_})));
 
     records.push_back({item.identifier, std::move(record)});
     for (Record& sub : related.records) records.push_back(std::move(sub));
@@ -363,7 +408,9 @@ class CalendarBuilder {
     }
   }
 
-  ICalCalendarSource& source_;
+  ICalParsedFiles& files_;
+  std::string identifier_;
+  std::string title_;
   ImportWarnings& warnings_;
   std::vector<Item> items_;
   std::map<std::string, std::size_t> positions_;
@@ -371,13 +418,44 @@ class CalendarBuilder {
 
 }  // namespace
 
+ICalParsedFiles parseICalFiles(std::vector<ICalFile> files, ImportWarnings& warnings) {
+  ICalParsedFiles parsed;
+  parsed.documents.reserve(files.size());
+  for (ICalFile& file : files) {
+    parsed.documents.push_back(ICalDocument::parse(file.text, file.name, warnings));
+    std::string().swap(file.text);  // libical holds what is needed of it
+    for (icalcomponent* vcalendar : parsed.documents.back().calendars()) {
+      for (icalproperty* property : propertiesOf(vcalendar)) {
+        if (icalproperty_isa(property) != ICAL_X_PROPERTY) continue;
+        const char* name = icalproperty_get_x_name(property);
+        const std::string lower = name != nullptr ? lowerAscii(name) : std::string();
+        std::optional<std::string>* label = lower == "x-wr-calname"    ? &parsed.labels.name
+                                            : lower == "x-wr-relcalid" ? &parsed.labels.relationId
+                                                                       : nullptr;
+        if (label != nullptr && !*label) *label = text(icalproperty_get_x(property));
+      }
+    }
+  }
+  return parsed;
+}
+
+ICalCalendar readICalCalendar(ICalParsedFiles files, std::string identifier, std::string title,
+                              ImportWarnings& warnings) {
+  return CalendarBuilder(files, std::move(identifier), std::move(title), warnings).build();
+}
+
 ICalCalendar readICalCalendar(ICalCalendarSource source, ImportWarnings& warnings) {
-  return CalendarBuilder(source, warnings).build();
+  ICalParsedFiles files = parseICalFiles(std::move(source.files), warnings);
+  std::string title = source.title        ? *source.title
+                      : files.labels.name ? *files.labels.name
+                                          : source.fallbackTitle;
+  return readICalCalendar(std::move(files), std::move(source.identifier), std::move(title),
+                          warnings);
 }
 
 ICalCalendar readICalCalendar(ICalCalendarSource source) {
   ImportWarnings strict(OnFault::Refuse);
-  return CalendarBuilder(source, strict).build();
+  return readICalCalendar(std::move(source), strict);
 }
 
 }  // namespace tessel::importers

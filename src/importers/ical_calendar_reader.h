@@ -4,6 +4,7 @@
 #include <string>
 #include <vector>
 
+#include "importers/ical_document.h"
 #include "importers/import_warnings.h"
 #include "tessel/record.h"
 
@@ -16,19 +17,24 @@ struct ICalFile {
   std::string text;
 };
 
-// What becomes one calendar: one file, or every file of a vdir folder.
-struct ICalCalendarSource {
-  // The Calendar record's identifier; every record of the calendar gets an identifier that
-  // starts with it and a "/".
-  std::string identifier;
-  std::vector<ICalFile> files;
-  // A title the source fixes (a folder's); else the first X-WR-CALNAME of the files, else
-  // `fallbackTitle`.
-  std::optional<std::string> title;
-  std::string fallbackTitle;
+// What a calendar's files say about the calendar itself, in the X-WR- properties that
+// Apple, Google and Outlook write into the VCALENDAR: the first of each.
+struct ICalCalendarLabels {
+  std::optional<std::string> name;        // X-WR-CALNAME
+  std::optional<std::string> relationId;  // X-WR-RELCALID, the writer's identifier of it
 };
 
-// One calendar read from its source, not yet written anywhere.
+// The files of one calendar as libical read them, kept until their records are made.
+struct ICalParsedFiles {
+  std::vector<ICalDocument> documents;
+  ICalCalendarLabels labels;
+};
+
+// Parses the files, releasing the text of each once libical has read it. Faults go through
+// `warnings` (ICalDocument::parse), which outlives the result.
+ICalParsedFiles parseICalFiles(std::vector<ICalFile> files, ImportWarnings& warnings);
+
+// One calendar read from its files, not yet written anywhere.
 struct ICalCalendar {
   std::string identifier;
   std::string title;
@@ -39,14 +45,29 @@ struct ICalCalendar {
   std::size_t taskCount = 0;
 };
 
-// Reads the VEVENT and VTODO components of the source's files into records of the calendars
-// schema. Identifiers come from the calendar's identifier and each component's UID (and
-// RECURRENCE-ID), so that reading the same source again gives the same identifiers. Each
-// fault goes through `warnings`, naming its file and line: a value libical refuses or a date
-// that does not exist drops its property, or its event or task when that is the start of an
-// event or its RECURRENCE-ID; a time in a TZID that nothing defines is read as a floating
-// time. The source is taken by value so that the text of each file is released once libical
-// has read it.
+// Reads the VEVENT and VTODO components of the files into records of the calendars schema,
+// for the Calendar record `identifier` titled `title`. Every record of the calendar gets an
+// identifier that starts with the calendar's and a "/", then comes from the component's UID
+// (and RECURRENCE-ID), so that reading the same files again gives the same identifiers. A
+// component without UID is known by what it says; a second component with the UID of
+// another (and no RECURRENCE-ID) is kept as a copy of its own, with a warning. Each fault
+// goes through `warnings`, naming its file and line: a value libical refuses
+// or a date that does not exist drops its property, or its event or task when that is the
+// start of an event or its RECURRENCE-ID; a time in a TZID that nothing defines is read as
+// a floating time.
+ICalCalendar readICalCalendar(ICalParsedFiles files, std::string identifier, std::string title,
+                              ImportWarnings& warnings);
+
+// What becomes one calendar, for readers without a store: its identifier and files, and a
+// title the source fixes, else the files' X-WR-CALNAME, else `fallbackTitle`.
+struct ICalCalendarSource {
+  std::string identifier;
+  std::vector<ICalFile> files;
+  std::optional<std::string> title;
+  std::string fallbackTitle;
+};
+
+// parseICalFiles and readICalCalendar in one step, each fault through `warnings`.
 ICalCalendar readICalCalendar(ICalCalendarSource source, ImportWarnings& warnings);
 // The same, raising ImportError at the first fault.
 ICalCalendar readICalCalendar(ICalCalendarSource source);

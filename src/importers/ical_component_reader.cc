@@ -16,6 +16,12 @@ ImportError ComponentReader::error(icalproperty* property, std::string reason) c
   return document_.errorAt(property, component_, std::move(reason));
 }
 
+void ComponentReader::warn(icalproperty* property, std::string_view text) const {
+  std::optional<std::size_t> line = ICalDocument::lineOf(property);
+  if (!line) line = ICalDocument::lineOf(component_);
+  document_.warnings().note(document_.source(), line, std::string(text));
+}
+
 void ComponentReader::drop(const ImportError& fault, icalproperty* property) const {
   document_.warnings().fault(
       fault, "dropped the " + name(property) + " of " + ICalDocument::describe(component_));

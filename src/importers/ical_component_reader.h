@@ -7,6 +7,7 @@
 
 #include <optional>
 #include <string>
+#include <string_view>
 
 #include "importers/ical_document.h"
 #include "importers/ical_time_zones.h"
@@ -29,6 +30,8 @@ class ComponentReader {
       : document_(document), zones_(zones), component_(component) {}
 
   ImportError error(icalproperty* property, std::string reason) const;
+  // A warning at the line of `property`, or of the component when it is null.
+  void warn(icalproperty* property, std::string_view text) const;
 
   // `fault` costs `property`: a warning that names it and the component, or with
   // OnFault::Refuse the fault raised.

@@ -192,7 +192,7 @@ void reportUnreadLines(std::string_view text, const std::string& source, icalcom
   // looks for the lines libical refuses.
   ImportWarnings again(OnFault::Skip);
   std::vector<std::size_t> begins;
-  std::set<icalcomponent*> startless;
+  std::set<icalcomponent*> startless, triggerless;
   bool vCalendar = false;
   forEachICalContentLine(
       text, source,
@@ -229,6 +229,7 @@ void reportUnreadLines(std::string_view text, const std::string& source, icalcom
             icalcomponent_isa(component) == ICAL_VALARM_COMPONENT) {
           warnings.fault(ImportError(source, line.line, name + ": " + *complaint),
                          "dropped " + ICalDocument::describe(component));
+          triggerless.insert(component);
           return;
         }
         warnings.fault(ImportError(source, line.line, name + ": " + *complaint),
@@ -247,20 +248,23 @@ void reportUnreadLines(std::string_view text, const std::string& source, icalcom
     icalcomponent_remove_property(component, error);
     icalproperty_free(error);
   }
-  // An event is dropped once: one that stands in another dropped one goes with it. Which
-  // ones those are is known before any is freed.
+  // An event without its start and an alarm without its trigger were said dropped; they go
+  // now, so that nothing reads them as what they are not. Each is freed once: one inside
+  // another dropped one goes with it. Which ones those are is known before any is freed.
+  std::set<icalcomponent*> dropped = startless;
+  dropped.insert(triggerless.begin(), triggerless.end());
   std::vector<icalcomponent*> outermost;
-  for (icalcomponent* event : startless) {
+  for (icalcomponent* component : dropped) {
     bool inDropped = false;
-    for (icalcomponent* parent = icalcomponent_get_parent(event); parent != nullptr;
+    for (icalcomponent* parent = icalcomponent_get_parent(component); parent != nullptr;
          parent = icalcomponent_get_parent(parent)) {
-      inDropped = inDropped || startless.count(parent) != 0;
+      inDropped = inDropped || dropped.count(parent) != 0;
     }
-    if (!inDropped) outermost.push_back(event);
+    if (!inDropped) outermost.push_back(component);
   }
-  for (icalcomponent* event : outermost) {
-    icalcomponent_remove_component(icalcomponent_get_parent(event), event);
-    icalcomponent_free(event);
+  for (icalcomponent* component : outermost) {
+    icalcomponent_remove_component(icalcomponent_get_parent(component), component);
+    icalcomponent_free(component);
   }
 }
 
@@ -408,6 +412,10 @@ std::optional<std::size_t> ICalDocument::lineOf(icalcomponent* component) {
     }
   }
   return std::nullopt;
+}
+
+bool ICalDocument::isLineMark(std::string_view name) {
+  return name == kLineName;
 }
 
 std::string ICalDocument::describe(icalcomponent* component) {

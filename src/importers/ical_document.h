@@ -41,6 +41,8 @@ class ICalDocument {
   // The line a property or component starts on; none for what libical made up itself.
   static std::optional<std::size_t> lineOf(icalproperty_impl* property);
   static std::optional<std::size_t> lineOf(icalcomponent_impl* component);
+  // Whether a parameter or property of this name is the line mark, not data.
+  static bool isLineMark(std::string_view name);
 
   // An ImportError about this file at the line of `property` (or of `component` when the
   // property is null).

@@ -11,6 +11,12 @@ ItemFields readFields(const ComponentReader& reader, icalcomponent* component) {
   ItemFields fields;
   icalproperty* duration = nullptr;
   const bool task = icalcomponent_isa(component) == ICAL_VTODO_COMPONENT;
+  // These may appear once (RFC 5545 section 3.6.1); of two, the first counts, as calendar
+  // programs read them, and the other is named in a warning.
+  const auto secondOf = [&](const std::optional<ReadDate>& first, icalproperty* property) {
+    if (first) reader.warn(property, "a second " + reader.name(property) + ": ignored");
+    return first.has_value();
+  };
   const auto read = [&](icalproperty* property) {
     switch (icalproperty_isa(property)) {
       case ICAL_SUMMARY_PROPERTY:
@@ -39,13 +45,16 @@ ItemFields readFields(const ComponentReader& reader, icalcomponent* component) {
         }
         break;
       case ICAL_DTSTART_PROPERTY:
+        if (secondOf(fields.start, property)) break;
         fields.start = reader.date(property, icalproperty_get_dtstart(property));
         fields.startProperty = property;
         break;
       case ICAL_DTEND_PROPERTY:
+        if (secondOf(fields.end, property)) break;
         fields.end = reader.date(property, icalproperty_get_dtend(property));
         break;
       case ICAL_DUE_PROPERTY:
+        if (secondOf(fields.due, property)) break;
         fields.due = reader.date(property, icalproperty_get_due(property));
         break;
       case ICAL_COMPLETED_PROPERTY:

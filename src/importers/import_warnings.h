@@ -35,6 +35,10 @@ class ImportWarnings {
   // `fault` costs `consequence` ("dropped the PHOTO of the card "Jane Doe"").
   void fault(const ImportError& fault, std::string_view consequence);
 
+  // What an import read otherwise than written without a fault (an alarm without ACTION
+  // read as a display alarm): a warning with either OnFault.
+  void note(std::string source, std::optional<std::size_t> line, std::string message);
+
   const std::vector<ImportWarning>& all() const { return warnings_; }
   std::size_t count() const { return warnings_.size(); }
 

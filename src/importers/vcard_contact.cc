@@ -107,7 +107,11 @@ std::string_view phoneType(const ContentLine& line) {
 class Converter {
  public:
   Converter(const Card& card, const std::string& source, ImportWarnings& warnings)
-      : card_(card), source_(source), warnings_(warnings), version21_(card.version == "2.1") {}
+      : card_(card),
+        source_(source),
+        warnings_(warnings),
+        version21_(card.version == "2.1"),
+        escapes_(version21_ ? TextEscapes::Version21 : TextEscapes::Version3) {}
 
   ConvertedCard convert() {
     result_.line = card_.line;
@@ -186,7 +190,7 @@ class Converter {
 
   std::vector<std::string> components(const ContentLine& line) const {
     std::vector<std::string> parts;
-    for (const std::string& part : splitUnescaped(rawText(line), ';')) {
+    for (const std::string& part : splitUnescaped(rawText(line), ';', escapes_)) {
       parts.push_back(cleanText(part));
     }
     return parts;
@@ -194,8 +198,8 @@ class Converter {
 
   // Unescaped and trimmed, with every line end one "\n": quoted-printable values carry the
   // CRLF of the writer's system ("=0D=0A").
-  static std::string cleanText(std::string_view raw) {
-    const std::string text = unescapeText(raw);
+  std::string cleanText(std::string_view raw) const {
+    const std::string text = unescapeText(raw, escapes_);
     std::string out;
     out.reserve(text.size());
     for (std::size_t i = 0; i < text.size(); ++i) {
@@ -227,7 +231,7 @@ class Converter {
     // Every other value is decoded, whether used or not, so that a broken one is reported.
     const std::string raw = rawText(line);
     if (name == "N") {
-      const std::vector<std::string> parts = splitUnescaped(raw, ';');
+      const std::vector<std::string> parts = splitUnescaped(raw, ';', escapes_);
       // RFC 9554 section 4.6: an N with PHONETIC spells the name as it sounds.
       if (!line.parameter("PHONETIC").empty()) {
         setOnce(phoneticLast_, namePart(parts, 0, " "));
@@ -255,7 +259,7 @@ class Converter {
     } else if (name == "X-MAIDENNAME") {
       setOnce(maiden_, text(line));
     } else if (name == "NICKNAME") {
-      for (const std::string& nick : splitUnescaped(raw, ',')) {
+      for (const std::string& nick : splitUnescaped(raw, ',', escapes_)) {
         std::string one = cleanText(nick);
         if (!one.empty()) nicknames_.push_back(std::move(one));
       }
@@ -353,7 +357,7 @@ class Converter {
       if (raw[i] == '\\' && i + 1 < raw.size() && raw[i + 1] == ':') continue;
       link += raw[i];
     }
-    link = std::string(trimBlanks(unescapeText(link)));
+    link = std::string(trimBlanks(unescapeText(link, escapes_)));
     if (link.empty()) return;
     Dictionary record{{TesselAttribute_Contacts_URL_Value, Url{std::move(link)}}};
     for (const std::string& type : line.types()) {
@@ -414,9 +418,9 @@ class Converter {
     // RFC 2426 section 3.6.1: a comma-separated list. vCard 2.1 never defined the property;
     // its writers separate with ";" as well.
     std::vector<std::string> names;
-    for (const std::string& item : splitUnescaped(raw, ',')) {
+    for (const std::string& item : splitUnescaped(raw, ',', escapes_)) {
       if (version21_) {
-        for (const std::string& part : splitUnescaped(item, ';')) names.push_back(part);
+        for (const std::string& part : splitUnescaped(item, ';', escapes_)) names.push_back(part);
       } else {
         names.push_back(item);
       }
@@ -435,14 +439,16 @@ class Converter {
     const std::string encoding = lowerAscii(line.parameter("ENCODING"));
     Data bytes;
     try {
-      if (encoding == "b" || encoding == "base64") {
-        bytes = decodeBase64(line.value);
-      } else if (startsWithIgnoringAsciiCase(trimBlanks(line.value), "data:")) {
+      // A data: URI is one whatever the parameters say: some writers label it ENCODING=b
+      // as well (and base64 has no ':').
+      if (startsWithIgnoringAsciiCase(trimBlanks(line.value), "data:")) {
         // RFC 2397: data:[<media type>][;base64],<data>
         const std::string_view uri = trimBlanks(line.value);
         const std::size_t comma = uri.find(',');
         if (comma == std::string_view::npos) throw std::invalid_argument("bad data: URI");
-        const std::string meta = lowerAscii(uri.substr(5, comma - 5));
+        std::string meta = lowerAscii(uri.substr(5, comma - 5));
+        // A URI is no text value, yet writers escape its comma as in text ("base64\,").
+        if (meta.ends_with('\\')) meta.pop_back();
         const std::string_view payload = uri.substr(comma + 1);
         if (meta.ends_with(";base64")) {
           bytes = decodeBase64(payload);
@@ -450,6 +456,8 @@ class Converter {
           const std::string decoded = decodePercent(payload);
           bytes.assign(decoded.begin(), decoded.end());
         }
+      } else if (encoding == "b" || encoding == "base64") {
+        bytes = decodeBase64(line.value);
       } else {
         // A photo by reference (an http: URI) is not fetched.
         return;
@@ -549,6 +557,7 @@ class Converter {
   };
   mutable std::vector<CardFault> faults_;
   const bool version21_;
+  const TextEscapes escapes_;
   ConvertedCard result_;
   bool seenN_ = false;
   std::string first_, last_, middle_, prefix_, suffix_, formatted_, maiden_;

@@ -135,10 +135,12 @@ std::string toUtf8(std::string_view bytes, std::optional<std::string_view> chars
   return *text;
 }
 
-std::vector<std::string> splitUnescaped(std::string_view raw, char separator) {
+std::vector<std::string> splitUnescaped(std::string_view raw, char separator, TextEscapes escapes) {
   std::vector<std::string> parts(1);
   for (std::size_t i = 0; i < raw.size(); ++i) {
-    if (raw[i] == '\\' && i + 1 < raw.size()) {
+    const bool escape = raw[i] == '\\' && i + 1 < raw.size() &&
+                        (escapes == TextEscapes::Version3 || raw[i + 1] == ';');
+    if (escape) {
       parts.back() += raw[i];
       parts.back() += raw[++i];
     } else if (raw[i] == separator) {
@@ -150,7 +152,7 @@ std::vector<std::string> splitUnescaped(std::string_view raw, char separator) {
   return parts;
 }
 
-std::string unescapeText(std::string_view raw) {
+std::string unescapeText(std::string_view raw, TextEscapes escapes) {
   std::string out;
   out.reserve(raw.size());
   for (std::size_t i = 0; i < raw.size(); ++i) {
@@ -159,6 +161,10 @@ std::string unescapeText(std::string_view raw) {
       continue;
     }
     const char next = raw[i + 1];
+    if (escapes == TextEscapes::Version21 && next != ';') {
+      out += '\\';  // itself; what follows is read on its own
+      continue;
+    }
     if (next == 'n' || next == 'N') {
       out += '\n';
     } else if (next == '\\' || next == ',' || next == ';') {

@@ -30,11 +30,20 @@ std::string decodePercent(std::string_view text);
 // else is read as windows-1252, what vCard 2.1 writers without a CHARSET parameter meant.
 std::string toUtf8(std::string_view bytes, std::optional<std::string_view> charset);
 
-// Splits a raw value at each `separator` not preceded by a backslash; escapes stay.
-std::vector<std::string> splitUnescaped(std::string_view raw, char separator);
+// Which backslashes of a text value are escapes.
+enum class TextEscapes {
+  // vCard 2.1: a backslash only keeps a semicolon from separating ("\;"); every other one is
+  // itself, as in the Windows paths ("C:\Users\new") that its writers put in notes.
+  Version21,
+  // RFC 6350 section 3.4 (RFC 2426 section 5 alike): "\n" or "\N" is a line end, "\\",
+  // "\,", "\;" the character itself. Other backslashes stay as written.
+  Version3,
+};
 
-// RFC 6350 section 3.4 (RFC 2426 section 5 alike): "\n" or "\N" is a line end, "\\", "\,",
-// "\;" the character itself. Other backslashes stay as written (Windows paths in notes).
-std::string unescapeText(std::string_view raw);
+// Splits a raw value at each `separator` that is not escaped; escapes stay.
+std::vector<std::string> splitUnescaped(std::string_view raw, char separator,
+                                        TextEscapes escapes = TextEscapes::Version3);
+
+std::string unescapeText(std::string_view raw, TextEscapes escapes = TextEscapes::Version3);
 
 }  // namespace tessel::importers

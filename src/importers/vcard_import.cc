@@ -119,6 +119,9 @@ void VCardImport::addPaths(const std::vector<fs::path>& paths) {
       }
     }
     if (error) throw ImportError(path.string(), std::nullopt, "cannot read: " + error.message());
+    // Nothing to read is a mistyped folder more often than an empty address book.
+    if (files.empty())
+      throw ImportError(path.string(), std::nullopt, "no .vcf file in this folder");
     std::sort(files.begin(), files.end());
     for (const fs::path& file : files) addFile(file);
   }

@@ -69,10 +69,17 @@ std::string refreshCalendar(Store& store, const Source& source, std::optional<st
     importers::ICalCalendarSource read;
     read.identifier = calendarIdentifierForAddress(source.location);
     read.files.push_back({source.location, std::move(*text)});
-    read.fallbackTitle = source.title ? *source.title : titleOfAddress(source.location);
+    read.title = source.title;
+    read.fallbackTitle = titleOfAddress(source.location);
     calendars.push_back(importers::readICalCalendar(std::move(read), warnings));
   } else {
-    calendars = importers::readICalendarPaths({source.location}, source.title, warnings);
+    // The calendar is found as `tessel import ical` finds it, so that a file imported once and
+    // then refreshed as a source stays one calendar.
+    importers::ICalImportTarget target;
+    target.title = source.title;
+    calendars =
+        importers::readICalendarPaths(importers::parseICalendarPaths({source.location}, warnings),
+                                      target, importers::knownCalendars(store), warnings);
   }
   const importers::ICalImportCounts counts =
       importers::writeICalCalendars(store, calendars, SyncDeletes::On);

@@ -53,7 +53,8 @@ std::vector<std::string> identifiers(const Dictionary& record, std::string_view 
 // N named from FN, a company card, CATEGORIES as groups linked both ways; 4.0 data: URI
 // photos and tel: URIs; a vdir folder whose KIND:group card lists members by UID; and edges/:
 // LF or CR alone and a tab as the fold's blank, windows-1252, UTF-16 with a byte-order mark,
-// and identifiers escaped.
+// identifiers escaped, 2.1 backslashes that only escape ";" ("C:\Users\new" stays), and a
+// data: URI photo whose comma is escaped as in text, and one labelled ENCODING=b as well.
 TEST(VCardImportContent, EachExportBecomesTheRecordsOfItsReferenceFile) {
   for (const char* source :
        {"outlook_21.vcf", "address_book_30.vcf", "server_40.vcf", "vdir", "edges"}) {

@@ -76,7 +76,7 @@ void addImportCommands(CLI::App& app, CommandLine& line) {
     std::vector<std::string> vcardPaths;
     bool vcardSyncDeletes = false;
     std::vector<std::string> icalPaths;
-    std::optional<std::string> icalTitle;
+    ICalImportChoices ical;
     bool icalSyncDeletes = false;
     bool strict = false;
   };
@@ -106,17 +106,24 @@ void addImportCommands(CLI::App& app, CommandLine& line) {
   auto* ical = import->add_subcommand(
       "ical",
       "iCalendar (and vCalendar 1.0) files and folders of .ics files (vdir), one calendar per "
-      "file or folder. What cannot be read is left out with a warning, and the rest imported");
+      "file or folder. A calendar imported before is found again by its X-WR-RELCALID, else by "
+      "its title, also when the file was moved or downloaded again under another name. What "
+      "cannot be read is left out with a warning, and the rest imported");
   ical->add_option("PATH", options->icalPaths, ".ics files or folders")->required();
-  ical->add_option("--title", options->icalTitle,
-                   "Title of calendars whose source names none (default: the file name)");
+  ical->add_option("--title", options->ical.title,
+                   "Title of the calendars, over the one their files give (default: "
+                   "X-WR-CALNAME, else the file or folder name)");
+  ical->add_option("--calendar", options->ical.calendar,
+                   "Import into this calendar of the store (its title, a unique start of it, or "
+                   "its identifier)");
   ical->add_flag("--sync-deletes", options->icalSyncDeletes,
-                 "Also delete the records of these calendars that this import does not produce");
+                 "Also delete the events and tasks of these calendars that this import does not "
+                 "produce");
   ical->add_flag("--strict", options->strict,
                  "Import nothing unless every file is valid: the first fault is an error");
   ical->callback([&line, options] {
     line.command = [options](CommandContext& context) {
-      importICalendars(context, options->icalPaths, options->icalTitle,
+      importICalendars(context, options->icalPaths, options->ical,
                        options->icalSyncDeletes ? SyncDeletes::On : SyncDeletes::Off,
                        options->strict ? OnFault::Refuse : OnFault::Skip);
     };

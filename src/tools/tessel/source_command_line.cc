@@ -38,8 +38,9 @@ void addSourceCommands(CLI::App& app, CommandLine& line) {
   auto* calendar = add->add_flag("--calendar", options->calendar,
                                  "It holds one calendar (default: read from it)");
   add->add_flag("--address-book", options->addressBook, "It holds contacts")->excludes(calendar);
-  add->add_option("--title", options->title,
-                  "Title of the calendar when the source names none; a label for an address book");
+  add->add_option(
+      "--title", options->title,
+      "Title of the calendar, over the name the source gives it; a label for an address book");
   add->add_option("--credentials", options->credentials,
                   "File whose first line is USER:PASSWORD for the address (chmod 600)");
   add->add_flag("--lenient", options->lenient,

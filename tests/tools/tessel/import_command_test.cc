@@ -28,7 +28,7 @@ TEST_F(ImportCommand, ImportsFilesAndFoldersAndImportingAgainChangesNothing) {
   Outcome run = tessel({"import", "vcard", cards});
   ASSERT_EQ(run.status, 0) << run.err;
   EXPECT_CONTAINS(run.out, "2 contacts, 1 group from 3 files; ");
-  run = tessel({"import", "ical", outlook, family, "--title", "Spare"});
+  run = tessel({"import", "ical", outlook, family});
   ASSERT_EQ(run.status, 0) << run.err;
   EXPECT_CONTAINS(run.out, "\"Büro\": 3 events, 0 tasks\n");
   EXPECT_CONTAINS(run.out, "\"Family\": 3 events, 0 tasks\n");
@@ -52,19 +52,29 @@ TEST_F(ImportCommand, SyncDeletesAndTitles) {
   Outcome run = tessel({"import", "vcard", "--sync-deletes", (dir_ / "cards").string()});
   EXPECT_EQ(run.out, "1 contact, 0 groups from 1 file; 0 written, 2 deleted\n") << run.err;
 
+  // A calendar downloaded again is found again, by its title; --sync-deletes deletes what
+  // left it. --title names a calendar, --calendar names one of the store.
   const fs::path file = dir_ / "Team Plans.ics";
   writeFile(file,
             "BEGIN:VCALENDAR\r\nBEGIN:VEVENT\r\nUID:a\r\nEND:VEVENT\r\n"
             "BEGIN:VEVENT\r\nUID:b\r\nEND:VEVENT\r\nEND:VCALENDAR\r\n");
   run = tessel({"import", "ical", file.string()});
   EXPECT_CONTAINS(run.out, "\"Team Plans\": 2 events, 0 tasks\n");
-  writeFile(file, "BEGIN:VCALENDAR\r\nBEGIN:VEVENT\r\nUID:a\r\nEND:VEVENT\r\nEND:VCALENDAR\r\n");
-  run = tessel({"import", "ical", file.string(), "--title", "Plans"});
-  EXPECT_CONTAINS(run.out, "\"Plans\": 1 event, 0 tasks\n1 written, 0 deleted\n");
-  EXPECT_CONTAINS(listJson(), "/event/b\"");
-  run = tessel({"import", "ical", "--sync-deletes", file.string()});
+  const fs::path again = dir_ / "Team Plans (1).ics";
+  writeFile(again, "BEGIN:VCALENDAR\r\nBEGIN:VEVENT\r\nUID:a\r\nEND:VEVENT\r\nEND:VCALENDAR\r\n");
+  run = tessel({"import", "ical", "--sync-deletes", again.string()});
   EXPECT_CONTAINS(run.out, "\"Team Plans\": 1 event, 0 tasks\n1 written, 1 deleted\n");
   EXPECT_EQ(listJson().find("/event/b\""), std::string::npos);
+  run = tessel({"import", "ical", again.string(), "--title", "Plans"});
+  EXPECT_CONTAINS(run.out, "\"Plans\": 1 event, 0 tasks\n");
+  writeFile(dir_ / "w.ics",
+            "BEGIN:VCALENDAR\r\nX-WR-CALNAME:Work\r\nBEGIN:VEVENT\r\nUID:w\r\n"
+            "BEGIN:VALARM\r\nTRIGGER:-PT5M\r\nEND:VALARM\r\nEND:VEVENT\r\nEND:VCALENDAR\r\n");
+  run = tessel({"import", "ical", (dir_ / "w.ics").string(), "--calendar", "Team"});
+  EXPECT_CONTAINS(run.out, "\"Team Plans\": 1 event, 0 tasks\n");
+  EXPECT_CONTAINS(run.err, "\ntessel: warning: " + (dir_ / "w.ics").string() +
+                               ": line 5: VALARM without ACTION: read as a display alarm\n");
+  EXPECT_EQ(tessel({"calendars", "list"}).out.find("Work"), std::string::npos);
 }
 
 // A fault costs what cannot be read, with a warning and the count in the summary; with
@@ -96,6 +106,17 @@ TEST_F(ImportCommand, FaultsCostWhatCannotBeReadOrWithStrictEverything) {
   run = tessel({"import", "ical", (dir_ / "none.ics").string()});
   EXPECT_EQ(run.err, "tessel: " + (dir_ / "none.ics").string() + ": no such file or folder\n");
   EXPECT_EQ(tessel({"import", "vcard", (dir_ / "nowhere.vcf").string()}).status, 1);
+  // A folder with nothing to read is a mistake, not an empty calendar or address book.
+  const fs::path empty = dir_ / "empty";
+  fs::create_directory(empty);
+  run = tessel({"import", "ical", empty.string()});
+  EXPECT_EQ(run.status, 1);
+  EXPECT_EQ(run.err, "tessel: " + empty.string() + ": no .ics file in this folder\n");
+  run = tessel({"import", "vcard", empty.string()});
+  EXPECT_EQ(run.err, "tessel: " + empty.string() + ": no .vcf file in this folder\n");
+  run = tessel({"import", "ical", (dir_ / "bad.ics").string(), "--calendar", "Nope"});
+  EXPECT_EQ(run.status, 2);
+  EXPECT_CONTAINS(run.err, "\"Nope\" is not a calendar of the store");
   EXPECT_EQ(listJson(), before);
 
   run = tessel({"import", "vcard", good, bad});
