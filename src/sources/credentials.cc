@@ -3,6 +3,7 @@
 #include <fstream>
 #include <string>
 #include <system_error>
+#include <utility>
 
 namespace tessel::sources {
 
@@ -29,6 +30,22 @@ Result<BasicCredentials> readCredentials(const fs::path& file) {
   if (colon == std::string::npos || colon == 0)
     return Error{"credentials file " + file.string() + ": its first line must be USER:PASSWORD"};
   return BasicCredentials{line.substr(0, colon), line.substr(colon + 1)};
+}
+
+Result<std::optional<BasicCredentials>> credentialsOf(const Source& source,
+                                                      SecretService& secrets) {
+  if (source.credentialsFile) {
+    auto read = readCredentials(*source.credentialsFile);
+    if (!read) return Error{read.error()};
+    return std::optional<BasicCredentials>(std::move(read).value());
+  }
+  if (source.secretServiceUser) {
+    auto password = secrets.password(*source.secretServiceUser, serverOfAddress(source.location));
+    if (!password) return Error{password.error()};
+    return std::optional<BasicCredentials>(
+        BasicCredentials{*source.secretServiceUser, std::move(password).value()});
+  }
+  return std::optional<BasicCredentials>();
 }
 
 }  // namespace tessel::sources

@@ -32,6 +32,7 @@ nlohmann::json toJson(const Source& source) {
                          {"collection", collectionName(source.collection)}};
   if (source.title) json["title"] = *source.title;
   if (source.credentialsFile) json["credentials"] = source.credentialsFile->string();
+  if (source.secretServiceUser) json["secret-service-user"] = *source.secretServiceUser;
   if (source.onFault == importers::OnFault::Skip) json["lenient"] = true;
   return json;
 }
@@ -51,6 +52,8 @@ Result<Source> fromJson(const nlohmann::json& json) {
     source.title = json["title"].get<std::string>();
   if (json.contains("credentials") && json["credentials"].is_string())
     source.credentialsFile = fs::path(json["credentials"].get<std::string>());
+  if (json.contains("secret-service-user") && json["secret-service-user"].is_string())
+    source.secretServiceUser = json["secret-service-user"].get<std::string>();
   if (json.contains("lenient") && json["lenient"] == true)
     source.onFault = importers::OnFault::Skip;
   return source;
@@ -66,6 +69,13 @@ bool Source::isAddress(std::string_view location) {
 
 std::string_view collectionName(Collection collection) {
   return collection == Collection::AddressBook ? "address book" : "calendar";
+}
+
+std::string serverOfAddress(std::string_view address) {
+  const std::size_t scheme = address.find("://");
+  const std::size_t start = scheme == std::string_view::npos ? 0 : scheme + 3;
+  return zt::platform::lowerAscii(
+      address.substr(start, address.find_first_of("/?#", start) - start));
 }
 
 fs::path SourceList::defaultPath() {

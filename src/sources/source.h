@@ -23,8 +23,11 @@ struct Source {
   Collection collection = Collection::Calendar;
   // A calendar's title when the source names none; a label for an address book.
   std::optional<std::string> title;
-  // The file with "USER:PASSWORD" for HTTP basic authentication.
+  // Where the password for HTTP basic authentication comes from, if one is needed: the file
+  // with "USER:PASSWORD", or the user whose password the desktop's secret service keeps for the
+  // address's server (secret_service.h), asked at each refresh. Never both.
   std::optional<std::filesystem::path> credentialsFile;
+  std::optional<std::string> secretServiceUser;
   // What a fault in its text costs. Refuse by default: a refresh runs unattended (when a player
   // is plugged in), and a source it cannot wholly read keeps what the store had of it rather
   // than losing an event or a property; Skip reads it as `tessel import` does, with warnings.
@@ -35,6 +38,11 @@ struct Source {
 };
 
 std::string_view collectionName(Collection collection);  // "address book", "calendar"
+
+// The server of an address as the secret service keeps its passwords: the host in lower case,
+// with the port when the address names one ("dav.example.org", "127.0.0.1:5232"), so that the
+// collections of one server share the password of one user.
+std::string serverOfAddress(std::string_view address);
 
 // The list of sources, $XDG_CONFIG_HOME/tessel/sources.json (else ~/.config/tessel/...). It is
 // the user's configuration, like khal's and vdirsyncer's, not data of one store.

@@ -32,14 +32,11 @@ struct Download {
   Validators validators;
 };
 
-Result<Download> download(const Source& source, const SourceState& previous, HttpClient& http) {
-  std::optional<BasicCredentials> credentials;
-  if (source.credentialsFile) {
-    auto read = readCredentials(*source.credentialsFile);
-    if (!read) return Error{read.error()};
-    credentials = std::move(read).value();
-  }
-  auto response = http.get(source.location, credentials, previous.validators);
+Result<Download> download(const Source& source, const SourceState& previous, HttpClient& http,
+                          SecretService& secrets) {
+  auto credentials = credentialsOf(source, secrets);
+  if (!credentials) return Error{credentials.error()};
+  auto response = http.get(source.location, *credentials, previous.validators);
   if (!response) return Error{response.error()};
   if (response->freshness == Freshness::NotModified)
     return Download{std::nullopt, previous.validators};
@@ -160,13 +157,13 @@ std::string refreshAddressBook(Store& store, const Source& source,
 }
 
 SourceRefresh refreshOne(Store& store, const Source& source, const std::vector<Source>& sources,
-                         const SourceStates& states, HttpClient& http) {
+                         const SourceStates& states, HttpClient& http, SecretService& secrets) {
   SourceRefresh outcome;
   outcome.source = source;
   SourceState state = states.load(source);
   std::optional<std::string> text;
   if (source.isAddress()) {
-    auto fetched = download(source, state, http);
+    auto fetched = download(source, state, http, secrets);
     if (!fetched) {
       outcome.detail = fetched.error();
       return outcome;
@@ -217,10 +214,11 @@ std::string calendarIdentifierForAddress(const std::string& address) {
 
 std::vector<SourceRefresh> refreshSources(Store& store, const std::vector<Source>& sources,
                                           const SourceStates& states, HttpClient& http,
+                                          SecretService& secrets,
                                           const std::function<void(const SourceRefresh&)>& report) {
   std::vector<SourceRefresh> outcomes;
   for (const Source& source : sources) {
-    outcomes.push_back(refreshOne(store, source, sources, states, http));
+    outcomes.push_back(refreshOne(store, source, sources, states, http, secrets));
     if (report) report(outcomes.back());
   }
   return outcomes;

@@ -5,6 +5,7 @@
 #include <vector>
 
 #include "sources/http_client.h"
+#include "sources/secret_service.h"
 #include "sources/source.h"
 #include "sources/source_state.h"
 #include "tessel/store.h"
@@ -29,10 +30,12 @@ struct SourceRefresh {
 // (contacts are one pool, so the same card in two sources stays while either holds it). A source
 // that cannot be read, or whose text the importers refuse, changes nothing in the store and the
 // others go on; downloads are conditional on the validators of the last good one, and a
-// collection the server reports unchanged is not imported again. `report` hears of each source
-// as it ends.
+// collection the server reports unchanged is not imported again. A password is read as each
+// source needs it (credentialsOf): a secret service that cannot answer fails only the sources
+// that ask it. `report` hears of each source as it ends.
 std::vector<SourceRefresh> refreshSources(Store& store, const std::vector<Source>& sources,
                                           const SourceStates& states, HttpClient& http,
+                                          SecretService& secrets,
                                           const std::function<void(const SourceRefresh&)>& report);
 
 // The calendar identifier of a calendar read from an address (files and folders keep that of

@@ -4,6 +4,7 @@
 #include <stdexcept>
 
 #include "sources/http_client.h"
+#include "sources/secret_service.h"
 #include "sources/source_refresh.h"
 
 namespace tessel::cli {
@@ -17,8 +18,9 @@ RefreshOutcome refreshSources(CommandContext& context) {
   Store& store = context.store();
   const sources::SourceStates states(context.storePath());
   const auto http = sources::makeHttpClient();
+  const auto secrets = sources::makeSecretService();
   sources::refreshSources(
-      store, list->sources(), states, *http, [&](const sources::SourceRefresh& refresh) {
+      store, list->sources(), states, *http, *secrets, [&](const sources::SourceRefresh& refresh) {
         const sources::Source& source = refresh.source;
         if (refresh.result == sources::RefreshResult::Failed) {
           ++outcome.failed;

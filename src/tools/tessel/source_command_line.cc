@@ -18,6 +18,8 @@ void addSourceCommands(CLI::App& app, CommandLine& line) {
     bool addressBook = false;
     std::optional<std::string> title;
     std::optional<std::string> credentials;
+    std::optional<std::string> user;
+    bool secretService = false;
     bool lenient = false;
     std::string removed;
   };
@@ -41,8 +43,19 @@ void addSourceCommands(CLI::App& app, CommandLine& line) {
   add->add_option(
       "--title", options->title,
       "Title of the calendar, over the name the source gives it; a label for an address book");
-  add->add_option("--credentials", options->credentials,
-                  "File whose first line is USER:PASSWORD for the address (chmod 600)");
+  auto* credentials =
+      add->add_option("--credentials", options->credentials,
+                      "File whose first line is USER:PASSWORD for the address (chmod 600)");
+  auto* user = add->add_option("--user", options->user,
+                               "User name on the server, whose password the desktop's secret "
+                               "service keeps (with --secret-service)");
+  auto* secretService = add->add_flag(
+      "--secret-service", options->secretService,
+      "Ask the desktop's secret service for the password of --user at each refresh (store it "
+      "with: secret-tool store --label=LABEL xdg:schema org.zeto.tessel.Source user USER server "
+      "HOST[:PORT])");
+  user->needs(secretService)->excludes(credentials);
+  secretService->needs(user)->excludes(credentials);
   add->add_flag("--lenient", options->lenient,
                 "Read it as `tessel import` does: a fault costs only what cannot be read, with a "
                 "warning (default: the source keeps what it brought before, and the refresh says "
@@ -53,6 +66,7 @@ void addSourceCommands(CLI::App& app, CommandLine& line) {
       if (options->calendar) collection = sources::Collection::Calendar;
       if (options->addressBook) collection = sources::Collection::AddressBook;
       addSource(context, options->location, collection, options->title, options->credentials,
+                options->user,
                 options->lenient ? importers::OnFault::Skip : importers::OnFault::Refuse);
     };
   });

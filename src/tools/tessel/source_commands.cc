@@ -10,6 +10,7 @@
 #include "sources/collection_text.h"
 #include "sources/credentials.h"
 #include "sources/http_client.h"
+#include "sources/secret_service.h"
 #include "sources/source_state.h"
 #include "tools/tessel/usage_error.h"
 
@@ -30,12 +31,11 @@ SourceList loadList() {
 
 // A password in the address would show in `source list`, in messages and on command lines.
 void refuseUserInAddress(const std::string& address) {
-  const std::size_t start = address.find("://") + 3;
-  const std::string authority = address.substr(start, address.find_first_of("/?#", start) - start);
-  if (authority.find('@') != std::string::npos)
+  if (sources::serverOfAddress(address).find('@') != std::string::npos)
     throw UsageError(
-        "the address carries a user name: put USER:PASSWORD in a file only you "
-        "can read and name it with --credentials");
+        "the address carries a user name: put USER:PASSWORD in a file only you can read and "
+        "name it with --credentials, or name the user with --user and keep the password in the "
+        "desktop's secret service (--secret-service)");
 }
 
 // Basic authentication over http beyond this machine (RFC 7617, section 4: the password is
@@ -52,13 +52,8 @@ bool sendsPasswordInClear(const std::string& address) {
   return host != "localhost" && host != "[::1]" && !host.starts_with("127.");
 }
 
-Collection collectionOfAddress(const Source& source) {
-  std::optional<sources::BasicCredentials> credentials;
-  if (source.credentialsFile) {
-    auto read = sources::readCredentials(*source.credentialsFile);
-    if (!read) throw std::runtime_error(read.error());
-    credentials = std::move(read).value();
-  }
+Collection collectionOfAddress(const Source& source,
+                               const std::optional<sources::BasicCredentials>& credentials) {
   const auto http = sources::makeHttpClient();
   auto response = http->get(source.location, credentials, {});
   if (!response) throw std::runtime_error("cannot tell what it holds: " + response.error());
@@ -76,26 +71,32 @@ Collection collectionOfAddress(const Source& source) {
 
 void addSource(CommandContext& context, const std::string& location,
                std::optional<Collection> collection, const std::optional<std::string>& title,
-               const std::optional<std::string>& credentialsFile, importers::OnFault onFault) {
+               const std::optional<std::string>& credentialsFile,
+               const std::optional<std::string>& secretServiceUser, importers::OnFault onFault) {
   SourceList list = loadList();
   Source source;
   source.title = title;
   source.onFault = onFault;
+  std::optional<sources::BasicCredentials> credentials;
   if (Source::isAddress(location)) {
     refuseUserInAddress(location);
     source.location = location;
-    if (credentialsFile) {
-      source.credentialsFile = fs::absolute(*credentialsFile);
-      auto read = sources::readCredentials(*source.credentialsFile);
-      if (!read) throw std::runtime_error(read.error());
-      if (sendsPasswordInClear(location))
-        std::cerr << "tessel: warning: the password goes over plain http, readable on the way; "
-                     "use the https address if the server has one\n";
-    }
+    if (credentialsFile) source.credentialsFile = fs::absolute(*credentialsFile);
+    source.secretServiceUser = secretServiceUser;
+    // A password that cannot be had now would fail every refresh: say so while the person is
+    // here to store it.
+    const auto secrets = sources::makeSecretService();
+    auto found = sources::credentialsOf(source, *secrets);
+    if (!found) throw std::runtime_error(found.error());
+    credentials = std::move(found).value();
+    if (credentials && sendsPasswordInClear(location))
+      std::cerr << "tessel: warning: the password goes over plain http, readable on the way; "
+                   "use the https address if the server has one\n";
   } else {
     if (location.find("://") != std::string::npos)
       throw UsageError(location + ": only http, https and webcal addresses are read");
-    if (credentialsFile) throw UsageError("--credentials is for addresses, not files");
+    if (credentialsFile || secretServiceUser)
+      throw UsageError("--credentials and --secret-service are for addresses, not files");
     std::error_code error;
     if (!fs::exists(location, error))
       throw std::runtime_error(location + ": no such file or folder");
@@ -108,7 +109,7 @@ void addSource(CommandContext& context, const std::string& location,
   if (collection) {
     source.collection = *collection;
   } else if (source.isAddress()) {
-    source.collection = collectionOfAddress(source);
+    source.collection = collectionOfAddress(source, credentials);
   } else if (auto found = sources::collectionOfPath(source.location)) {
     source.collection = *found;
   } else {
@@ -131,6 +132,9 @@ void listSources(CommandContext& context) {
     if (source.title) context.out() << "\ttitle: " << *source.title;
     if (source.credentialsFile)
       context.out() << "\tcredentials: " << source.credentialsFile->string();
+    if (source.secretServiceUser)
+      context.out() << "\tcredentials: secret service, user " << *source.secretServiceUser << " at "
+                    << sources::serverOfAddress(source.location);
     if (source.onFault == importers::OnFault::Skip) context.out() << "\tlenient";
     context.out() << '\n';
   }

@@ -2,9 +2,11 @@
 // CalDAV/CardDAV server, filled with HTTP PUT and DELETE as any client fills it) and a plain
 // HTTP server of files that the test controls (collection_server.py), each with its own
 // temporary storage and a free port. Skipped where radicale or python3 is not installed
-// (scripts/setup --tests installs them).
+// (scripts/setup --tests installs them), and the secret service's case where GNOME Keyring,
+// secret-tool or dbus-run-session is missing or cannot start.
 
 #include <chrono>
+#include <optional>
 #include <thread>
 
 #include "support/radicale_server.h"
@@ -20,6 +22,53 @@ using zt::test_support::eventText;
 using zt::test_support::splitLines;
 
 constexpr const char* kPython = "/usr/bin/python3";
+
+// GNOME Keyring on a session bus of its own (dbus-run-session, which ends the bus and the
+// keyring with it once its shell sees the stop file), with its keyrings under `home`, and
+// unlocked with a password of the test's as a desktop login unlocks it. Sets
+// DBUS_SESSION_BUS_ADDRESS, HOME and the XDG folders for the programs the test runs.
+class KeyringSession {
+ public:
+  KeyringSession(const fs::path& home, zt::test_support::ScopedEnvironment& environment)
+      : stop_(home / "stop") {
+    for (const char* program :
+         {"/usr/bin/dbus-run-session", "/usr/bin/gnome-keyring-daemon", "/usr/bin/secret-tool"})
+      if (!fs::exists(program)) return;
+    const fs::path runtime = home / "runtime", address = home / "bus-address";
+    fs::create_directories(runtime);
+    fs::permissions(runtime, fs::perms::owner_all);
+    environment.set("HOME", home.string());
+    environment.set("XDG_DATA_HOME", (home / "data").string());
+    environment.set("XDG_RUNTIME_DIR", runtime.string());
+    environment.unset("DISPLAY");
+    bus_.emplace(std::vector<std::string>{"/usr/bin/dbus-run-session", "--", "/bin/sh", "-c",
+                                          "printf %s \"$DBUS_SESSION_BUS_ADDRESS\" > " +
+                                              address.string() + ".new && mv " + address.string() +
+                                              ".new " + address.string() + "; while [ ! -e " +
+                                              stop_.string() + " ]; do sleep 0.1; done"});
+    for (int tries = 0; tries < 200 && !fs::exists(address); ++tries)
+      std::this_thread::sleep_for(std::chrono::milliseconds(50));
+    if (!fs::exists(address)) return;
+    environment.set("DBUS_SESSION_BUS_ADDRESS", readFile(address));
+    zt::test_support::ProcessOptions unlock;
+    unlock.input = "keyring-login";
+    running_ = zt::test_support::runProcess(
+                   {"/usr/bin/gnome-keyring-daemon", "--unlock", "--components=secrets"}, unlock)
+                   .status == 0;
+  }
+  ~KeyringSession() {
+    if (!bus_) return;
+    writeFile(stop_, "");
+    bus_->wait();
+  }
+
+  bool running() const { return running_; }
+
+ private:
+  fs::path stop_;
+  std::optional<zt::test_support::BackgroundProcess> bus_;
+  bool running_ = false;
+};
 
 class SourceRefresh : public TesselCommandTest {
  protected:
@@ -115,6 +164,65 @@ TEST_F(SourceRefresh, RadicaleCollectionsComeInLeaveTheStoreAndSurviveAWrongPass
   ASSERT_EQ(run.status, 0) << run.err;
   EXPECT_EQ(count("tessel.calendars.Event"), 0u);
   EXPECT_EQ(count("tessel.contacts.Contact"), 1u);
+}
+
+TEST_F(SourceRefresh, PasswordFromTheSecretServiceAndWhatToDoWhenItCannotAnswer) {
+  const std::string password = "kr-7f3e-pass";
+  writeFile(dir_ / "users", "alice:" + password + "\n");
+  const zt::test_support::RadicaleServer radicale(dir_.path(), dir_ / "users");
+  ASSERT_TRUE(radicale.listening());
+  ASSERT_EQ(radicale.makeCalendar("work"), "201");
+  ASSERT_EQ(radicale.request("PUT", "work/e1.ics", eventText("e1", "Standup")), "201");
+  const std::string address = radicale.home() + "work/";
+  const KeyringSession keyring(dir_ / "home", environment_);
+  if (!keyring.running()) GTEST_SKIP() << "GNOME Keyring cannot start here";
+
+  // Without the password in the keyring the source is not added, and the message says how to
+  // store it; what it says, run as it is, stores it.
+  Outcome run = tessel({"source", "add", address, "--user", "alice", "--secret-service"});
+  EXPECT_EQ(run.status, 1);
+  const std::size_t hint = run.err.find("secret-tool store --label=");
+  ASSERT_NE(hint, std::string::npos) << run.err;
+  const std::string store = run.err.substr(hint, run.err.rfind(')') - hint);
+  EXPECT_CONTAINS(store, "xdg:schema org.zeto.tessel.Source user alice server 127.0.0.1:");
+  zt::test_support::ProcessOptions typed;
+  typed.input = password;
+  ASSERT_EQ(zt::test_support::runProcess({"/bin/sh", "-c", store}, typed).status, 0);
+
+  run = tessel({"source", "add", address, "--user", "alice", "--secret-service"});
+  ASSERT_EQ(run.status, 0) << run.err;
+  run = tessel({"source", "list"});
+  EXPECT_CONTAINS(run.out, "credentials: secret service, user alice at 127.0.0.1:");
+  run = tessel({"refresh"});
+  ASSERT_EQ(run.status, 0) << run.err;
+  EXPECT_CONTAINS(run.out, "\"work\": 1 event, 0 tasks");
+  EXPECT_FALSE(contains(readFile(dir_ / "config" / "tessel" / "sources.json"), password));
+
+  // No session bus (a unit without the user's bus) and a locked keyring: the refresh fails,
+  // says what to do, and the store keeps the event.
+  ASSERT_EQ(radicale.request("DELETE", "work/e1.ics"), "200");
+  std::string said;
+  {
+    zt::test_support::ScopedEnvironment noBus;
+    noBus.unset("DBUS_SESSION_BUS_ADDRESS");
+    run = tessel({"refresh"});
+    EXPECT_EQ(run.status, 1);
+    EXPECT_CONTAINS(run.err, "run tessel in your desktop session");
+    said += run.out + run.err;
+  }
+  ASSERT_EQ(
+      zt::test_support::runProcess(
+          {"/usr/bin/dbus-send", "--session", "--dest=org.freedesktop.secrets",
+           "--type=method_call", "/org/freedesktop/secrets", "org.freedesktop.Secret.Service.Lock",
+           "array:objpath:/org/freedesktop/secrets/collection/login"})
+          .status,
+      0);
+  run = tessel({"refresh"});
+  EXPECT_EQ(run.status, 1);
+  EXPECT_CONTAINS(run.err, "has no unlocked password of alice at 127.0.0.1:");
+  EXPECT_CONTAINS(run.err, "the store keeps what it had from it");
+  EXPECT_FALSE(contains(said + run.out + run.err, password));
+  EXPECT_EQ(count("tessel.calendars.Event"), 1u);
 }
 
 TEST_F(SourceRefresh, PlainServerAnswersUnchangedAndABrokenDownloadKeepsTheStore) {
