@@ -6,12 +6,12 @@
 #include <cstdlib>
 #include <map>
 #include <memory>
-#include <set>
 #include <utility>
 
 #include "importers/ical_alarm.h"
 #include "importers/ical_component_reader.h"
 #include "importers/ical_document.h"
+#include "importers/ical_document_visitor.h"
 #include "importers/ical_item_fields.h"
 #include "importers/ical_participants.h"
 #include "importers/ical_properties.h"
@@ -123,192 +123,95 @@ Array relationship(const std::vector<std::string>& identifiers) {
   return array;
 }
 
-enum class ItemKind { Event, Task };
-
-// One VEVENT or VTODO with what its identifier is made of.
-struct Item {
-  ItemKind kind;
-  const ICalDocument* document;
-  icalcomponent* component;
-  std::shared_ptr<ICalTimeZones> zones;
-  std::string uid;
-  std::optional<ReadDate> recurrenceId;
-  std::string identifier;
-  // The identifiers of the overrides of a master, in file order.
-  std::vector<std::string> detached;
-};
-
-// The sub-records of one event or task, with the relationships that list them.
-struct Related {
-  std::vector<Record> records;
-  std::vector<std::string> recurrences, audioAlarms, mailAlarms, displayAlarms, organizer,
-      attendees;
-};
-
-class CalendarBuilder {
+// The records of the VEVENT and VTODO components of the files, each made while its file is
+// read, before the calendar's identifier is known.
+class FileItemsReader : public ICalDocumentVisitor {
  public:
-  CalendarBuilder(ICalParsedFiles& files, std::string identifier, std::string title,
-                  ImportWarnings& warnings)
-      : files_(files),
-        identifier_(std::move(identifier)),
-        title_(std::move(title)),
-        warnings_(warnings) {}
+  explicit FileItemsReader(ICalParsedFiles& parsed) : parsed_(parsed) {}
 
-  ICalCalendar build() {
-    ICalCalendar calendar;
-    calendar.identifier = identifier_;
-    calendar.title = title_;
-    for (const ICalDocument& document : files_.documents) {
-      for (icalcomponent* vcalendar : document.calendars()) collect(document, vcalendar);
+  void calendar(const ICalDocument&, icalcomponent* vcalendar, ICalTimeZones& zones) override {
+    zones_ = &zones;
+    ICalCalendarLabels& labels = parsed_.labels;
+    for (icalproperty* property : propertiesOf(vcalendar)) {
+      if (icalproperty_isa(property) != ICAL_X_PROPERTY) continue;
+      const char* name = icalproperty_get_x_name(property);
+      const std::string lower = name != nullptr ? lowerAscii(name) : std::string();
+      std::optional<std::string>* label = lower == "x-wr-calname"    ? &labels.name
+                                          : lower == "x-wr-relcalid" ? &labels.relationId
+                                                                     : nullptr;
+      if (label != nullptr && !*label) *label = text(icalproperty_get_x(property));
     }
-    linkOverrides();
+  }
 
-    Dictionary calendarRecord{{TesselRecordEntityNameKey, Value(TesselEntity_Calendars_Calendar)},
-                              {TesselAttribute_Calendars_Calendar_Title, Value(calendar.title)}};
-    calendar.records.push_back({calendar.identifier, {}});
-    std::vector<std::string> events, tasks;
-    std::set<std::string> dropped;
-    for (Item& item : items_) {
-      try {
-        append(item, calendar.records);
-        (item.kind == ItemKind::Event ? events : tasks).push_back(item.identifier);
-      } catch (const ImportError& fault) {
-        warnings_.fault(fault, "dropped " + ICalDocument::describe(item.component));
-        dropped.insert(item.identifier);
+  // Nothing is kept until the item is read: its reading may start over (lineAt).
+  void item(const ICalDocument& document, icalcomponent* component) override {
+    ICalReadItem read;
+    read.event = icalcomponent_isa(component) == ICAL_VEVENT_COMPONENT;
+    read.source = document.source();
+    const ICalDocument identifying(document, read.identifying);
+    ComponentReader reader(identifying, *zones_, component);
+    icalproperty* uidProperty = nullptr;
+    std::optional<ReadDate> recurrenceId;
+    bool unreadable = false;
+    for (icalproperty* property : propertiesOf(component)) {
+      switch (icalproperty_isa(property)) {
+        case ICAL_UID_PROPERTY:
+          if (const char* uid = icalproperty_get_uid(property); uid != nullptr && !uidProperty) {
+            read.uid = uid;
+            uidProperty = property;
+          }
+          break;
+        case ICAL_RECURRENCEID_PROPERTY:
+          // Which occurrence a component replaces is what it is: without it, it is dropped.
+          if (recurrenceId) break;
+          try {
+            recurrenceId = reader.date(property, icalproperty_get_recurrenceid(property));
+          } catch (const ImportError& fault) {
+            read.identifying.fault(fault, "dropped " + ICalDocument::describe(component));
+            unreadable = true;
+          }
+          break;
+        default:
+          break;
       }
-      // What libical read of the component is not needed once it became records.
-      icalcomponent_remove_component(icalcomponent_get_parent(item.component), item.component);
-      icalcomponent_free(item.component);
-      item.component = nullptr;
     }
-    if (!dropped.empty()) forgetDetached(dropped, calendar.records);
-    calendar.eventCount = events.size();
-    calendar.taskCount = tasks.size();
-    calendarRecord.set(TesselRelationship_Calendars_Calendar_Events, Value(relationship(events)));
-    calendarRecord.set(TesselRelationship_Calendars_Calendar_Tasks, Value(relationship(tasks)));
-    calendar.records.front().record = std::move(calendarRecord);
-    return calendar;
+    if (unreadable) {
+      parsed_.items.push_back(std::move(read));
+      return;
+    }
+    read.overrides = recurrenceId.has_value();
+    // The content of a component whose identifier another may have too, kept as a hash: the
+    // component itself is gone before the other is read.
+    if (read.uid.empty() || !recurrenceId) read.contentHash = contentHash(component);
+    if (uidProperty != nullptr) read.uidLine = document.lineAt(uidProperty, component);
+    std::string key = read.event ? "/event/" : "/task/";
+    // RFC 5545 section 3.8.4.7 wants a UID in every component; for the few exporters that
+    // leave it out, what the component says stands in: two that say different things stay
+    // two, and the same file read again gives the same identifiers.
+    key += read.uid.empty() ? "no-uid-" + read.contentHash : escapedUid(read.uid);
+    if (recurrenceId) key += "/" + occurrenceKey(*recurrenceId);
+    read.key = std::move(key);
+
+    const ICalDocument reading(document, read.reading);
+    try {
+      records(reading, component, recurrenceId, read);
+    } catch (const ImportError& fault) {
+      read.reading.fault(fault, "dropped " + ICalDocument::describe(component));
+      read.dropped = true;
+      read.record = {};
+      read.related.clear();
+    }
+    parsed_.items.push_back(std::move(read));
   }
 
  private:
-  void collect(const ICalDocument& document, icalcomponent* vcalendar) {
-    auto zones = std::make_shared<ICalTimeZones>(vcalendar);
-    for (icalcomponent* component : componentsOf(vcalendar, ICAL_ANY_COMPONENT)) {
-      const icalcomponent_kind kind = icalcomponent_isa(component);
-      if (kind != ICAL_VEVENT_COMPONENT && kind != ICAL_VTODO_COMPONENT) continue;
-      Item item{kind == ICAL_VEVENT_COMPONENT ? ItemKind::Event : ItemKind::Task,
-                &document,
-                component,
-                zones,
-                {},
-                {},
-                {},
-                {}};
-      ComponentReader reader(document, *zones, component);
-      icalproperty* uidProperty = nullptr;
-      bool unreadable = false;
-      for (icalproperty* property : propertiesOf(component)) {
-        switch (icalproperty_isa(property)) {
-          case ICAL_UID_PROPERTY:
-            if (const char* uid = icalproperty_get_uid(property); uid != nullptr && !uidProperty) {
-              item.uid = uid;
-              uidProperty = property;
-            }
-            break;
-          case ICAL_RECURRENCEID_PROPERTY:
-            // Which occurrence a component replaces is what it is: without it, it is dropped.
-            if (item.recurrenceId) break;
-            try {
-              item.recurrenceId = reader.date(property, icalproperty_get_recurrenceid(property));
-            } catch (const ImportError& fault) {
-              warnings_.fault(fault, "dropped " + ICalDocument::describe(component));
-              unreadable = true;
-            }
-            break;
-          default:
-            break;
-        }
-      }
-      if (unreadable) continue;
-      std::string identifier = identifier_ + (item.kind == ItemKind::Event ? "/event/" : "/task/");
-      // RFC 5545 section 3.8.4.7 wants a UID in every component; for the few exporters that
-      // leave it out, what the component says stands in: two that say different things stay
-      // two, and the same file read again gives the same identifiers.
-      identifier += item.uid.empty() ? "no-uid-" + contentHash(component) : escapedUid(item.uid);
-      if (item.recurrenceId) identifier += "/" + occurrenceKey(*item.recurrenceId);
-      item.identifier = std::move(identifier);
-      add(std::move(item), reader, uidProperty);
-    }
-  }
-
-  // RFC 5545 section 3.8.4.7 makes a UID unique, yet calendars merged by hand or folders with
-  // conflict copies hold the same UID twice. Both are kept, the later one as a copy known by
-  // what it says, unless it says the same. Of two overrides of one occurrence the later one
-  // counts.
-  void add(Item item, const ComponentReader& reader, icalproperty* uidProperty) {
-    auto known = positions_.find(item.identifier);
-    if (known != positions_.end() && !item.recurrenceId && !item.uid.empty()) {
-      const std::string hash = contentHash(item.component);
-      if (hash != contentHash(items_[known->second].component)) {
-        item.identifier += "/copy-" + hash;
-        known = positions_.find(item.identifier);
-        if (known == positions_.end()) {
-          reader.warn(uidProperty, "UID " + item.uid + " is given twice: kept as a second " +
-                                       (item.kind == ItemKind::Event ? "event" : "task"));
-        }
-      }
-    } else if (known != positions_.end() && item.recurrenceId && !item.uid.empty()) {
-      reader.warn(uidProperty,
-                  "UID " + item.uid + " overrides the same occurrence twice: the later one counts");
-    }
-    if (known == positions_.end()) {
-      positions_.emplace(item.identifier, items_.size());
-      items_.push_back(std::move(item));
-    } else {
-      items_[known->second] = std::move(item);
-    }
-  }
-
-  // A master does not list the overrides that were dropped.
-  static void forgetDetached(const std::set<std::string>& dropped, std::vector<Record>& records) {
-    for (Record& record : records) {
-      const Value* detached = record.record.find(TesselRelationship_Calendars_Event_DetachedEvents);
-      if (detached == nullptr) continue;
-      std::vector<std::string> kept;
-      for (std::string& id : zt::platform::stringsIn(detached)) {
-        if (dropped.count(id) == 0) kept.push_back(std::move(id));
-      }
-      if (kept.empty()) {
-        record.record.erase(TesselRelationship_Calendars_Event_DetachedEvents);
-      } else {
-        record.record.set(TesselRelationship_Calendars_Event_DetachedEvents,
-                          Value(relationship(kept)));
-      }
-    }
-  }
-
-  // RFC 5545 section 3.8.4.4: a component with a RECURRENCE-ID replaces one occurrence of
-  // the component with the same UID and none; the master lists it as a detached event.
-  void linkOverrides() {
-    std::map<std::pair<ItemKind, std::string>, std::size_t> masters;
-    for (std::size_t i = 0; i < items_.size(); ++i) {
-      if (!items_[i].recurrenceId && !items_[i].uid.empty()) {
-        masters.emplace(std::make_pair(items_[i].kind, items_[i].uid), i);
-      }
-    }
-    for (Item& item : items_) {
-      if (!item.recurrenceId || item.kind != ItemKind::Event || item.uid.empty()) continue;
-      const auto master = masters.find({item.kind, item.uid});
-      if (master != masters.end()) items_[master->second].detached.push_back(item.identifier);
-    }
-  }
-
-  void append(const Item& item, std::vector<Record>& records) const {
-    ComponentReader reader(*item.document, *item.zones, item.component);
-    ItemFields fields = readFields(reader, item.component);
-    const bool event = item.kind == ItemKind::Event;
-    Related related;
-    if (event) relatedRecords(item, reader, fields, related);
+  void records(const ICalDocument& document, icalcomponent* component,
+               const std::optional<ReadDate>& recurrenceId, ICalReadItem& read) const {
+    ComponentReader reader(document, *zones_, component);
+    ItemFields fields = readFields(reader, component);
+    const bool event = read.event;
+    ICalReadItem related;
+    if (event) relatedRecords(document, component, reader, fields, related);
 
     // The event and task attributes share their names.
     Dictionary record{{TesselRecordEntityNameKey,
@@ -331,7 +234,7 @@ class CalendarBuilder {
       setDate(TesselAttribute_Calendars_Task_DueDate, fields.due);
       setDate(TesselAttribute_Calendars_Task_CompletionDate, fields.completed);
     }
-    setDate(TesselAttribute_Calendars_Event_OriginalDate, item.recurrenceId);
+    setDate(TesselAttribute_Calendars_Event_OriginalDate, recurrenceId);
     if (!fields.exceptionDates.empty()) {
       record.set(TesselAttribute_Calendars_Event_ExceptionDates,
                  Value(std::move(fields.exceptionDates)));
@@ -344,24 +247,21 @@ class CalendarBuilder {
     }
     if (fields.url)
       record.set(TesselAttribute_Calendars_Event_Url, Value(zt::platform::Url{*fields.url}));
-    const auto setRelationship = [&](std::string_view key, const std::vector<std::string>& ids) {
-      if (!ids.empty()) record.set(key, Value(relationship(ids)));
-    };
-    setRelationship(TesselRelationship_Calendars_Event_Recurrences, related.recurrences);
-    setRelationship(TesselRelationship_Calendars_Event_AudioAlarms, related.audioAlarms);
-    setRelationship(TesselRelationship_Calendars_Event_MailAlarms, related.mailAlarms);
-    setRelationship(TesselRelationship_Calendars_Event_DisplayAlarms, related.displayAlarms);
-    setRelationship(TesselRelationship_Calendars_Event_Organizer, related.organizer);
-    setRelationship(TesselRelationship_Calendars_Event_Attendees, related.attendees);
-    setRelationship(TesselRelationship_Calendars_Event_DetachedEvents, item.detached);
-    record.set(TesselRelationship_Calendars_Event_Calendar, Value(relationship({identifier_})));
 
-    records.push_back({item.identifier, std::move(record)});
-    for (Record& sub : related.records) records.push_back(std::move(sub));
+    read.record = std::move(record);
+    read.related = std::move(related.related);
+    read.recurrences = std::move(related.recurrences);
+    read.audioAlarms = std::move(related.audioAlarms);
+    read.mailAlarms = std::move(related.mailAlarms);
+    read.displayAlarms = std::move(related.displayAlarms);
+    read.organizer = std::move(related.organizer);
+    read.attendees = std::move(related.attendees);
   }
 
-  void relatedRecords(const Item& item, const ComponentReader& reader, const ItemFields& fields,
-                      Related& related) const {
+  // The sub-records, each known by what follows the identifier of its event.
+  void relatedRecords(const ICalDocument& document, icalcomponent* component,
+                      const ComponentReader& reader, const ItemFields& fields,
+                      ICalReadItem& related) const {
     std::size_t count = 0;
     for (icalproperty* rule : fields.rules) {
       std::optional<Dictionary> record;
@@ -371,41 +271,177 @@ class CalendarBuilder {
         reader.drop(fault, rule);
       }
       if (record) {
-        std::string id = item.identifier + "#recurrence" + std::to_string(++count);
+        std::string id = "#recurrence" + std::to_string(++count);
         related.recurrences.push_back(id);
-        related.records.push_back({std::move(id), std::move(*record)});
+        related.related.emplace_back(std::move(id), std::move(*record));
       }
     }
     count = 0;
-    for (icalcomponent* alarm : componentsOf(item.component, ICAL_VALARM_COMPONENT)) {
+    for (icalcomponent* alarm : componentsOf(component, ICAL_VALARM_COMPONENT)) {
       std::optional<Dictionary> record;
       try {
-        record = alarmRecord(*item.document, *item.zones, alarm, fields.start, fields.end);
+        record = alarmRecord(document, *zones_, alarm, fields.start, fields.end);
       } catch (const ImportError& fault) {
-        warnings_.fault(fault, "dropped " + ICalDocument::describe(alarm));
+        document.warnings().fault(fault, "dropped " + ICalDocument::describe(alarm));
       }
       if (!record) continue;
-      std::string id = item.identifier + "#alarm" + std::to_string(++count);
+      std::string id = "#alarm" + std::to_string(++count);
       const std::string& name = *record->stringAt(TesselRecordEntityNameKey);
       (name == TesselEntity_Calendars_AudioAlarm  ? related.audioAlarms
        : name == TesselEntity_Calendars_MailAlarm ? related.mailAlarms
                                                   : related.displayAlarms)
           .push_back(id);
-      related.records.push_back({std::move(id), std::move(*record)});
+      related.related.emplace_back(std::move(id), std::move(*record));
     }
     if (fields.organizer != nullptr) {
-      std::string id = item.identifier + "#organizer";
+      std::string id = "#organizer";
       related.organizer.push_back(id);
-      related.records.push_back(
-          {std::move(id), participantRecord(fields.organizer, TesselEntity_Calendars_Organizer)});
+      related.related.emplace_back(
+          std::move(id), participantRecord(fields.organizer, TesselEntity_Calendars_Organizer));
     }
     count = 0;
     for (icalproperty* attendee : fields.attendees) {
-      std::string id = item.identifier + "#attendee" + std::to_string(++count);
+      std::string id = "#attendee" + std::to_string(++count);
       related.attendees.push_back(id);
-      related.records.push_back(
-          {std::move(id), participantRecord(attendee, TesselEntity_Calendars_Attendee)});
+      related.related.emplace_back(std::move(id),
+                                   participantRecord(attendee, TesselEntity_Calendars_Attendee));
     }
+  }
+
+  ICalParsedFiles& parsed_;
+  // The zones of the calendar being read.
+  ICalTimeZones* zones_ = nullptr;
+};
+
+// One item of the calendar, under its whole identifier.
+struct Item {
+  ICalReadItem* read;
+  std::string identifier;
+  // The identifiers of the overrides of a master, in file order, with whether each was
+  // dropped.
+  std::vector<std::pair<std::string, bool>> detached;
+};
+
+class CalendarBuilder {
+ public:
+  CalendarBuilder(ICalParsedFiles& files, std::string identifier, std::string title,
+                  ImportWarnings& warnings)
+      : files_(files),
+        identifier_(std::move(identifier)),
+        title_(std::move(title)),
+        warnings_(warnings) {}
+
+  // The faults of identifying every item, then those of each item becoming records, as
+  // when every item was identified before any became records.
+  ICalCalendar build() {
+    ICalCalendar calendar;
+    calendar.identifier = identifier_;
+    calendar.title = title_;
+    for (ICalReadItem& read : files_.items) {
+      read.identifying.passOn(warnings_);
+      if (read.key) add(read);
+    }
+    linkOverrides();
+
+    Dictionary calendarRecord{{TesselRecordEntityNameKey, Value(TesselEntity_Calendars_Calendar)},
+                              {TesselAttribute_Calendars_Calendar_Title, Value(calendar.title)}};
+    calendar.records.push_back({calendar.identifier, {}});
+    std::vector<std::string> events, tasks;
+    for (Item& item : items_) {
+      item.read->reading.passOn(warnings_);
+      if (item.read->dropped) continue;
+      (item.read->event ? events : tasks).push_back(item.identifier);
+      append(item, calendar.records);
+    }
+    calendar.eventCount = events.size();
+    calendar.taskCount = tasks.size();
+    calendarRecord.set(TesselRelationship_Calendars_Calendar_Events, Value(relationship(events)));
+    calendarRecord.set(TesselRelationship_Calendars_Calendar_Tasks, Value(relationship(tasks)));
+    calendar.records.front().record = std::move(calendarRecord);
+    return calendar;
+  }
+
+ private:
+  // RFC 5545 section 3.8.4.7 makes a UID unique, yet calendars merged by hand or folders with
+  // conflict copies hold the same UID twice. Both are kept, the later one as a copy known by
+  // what it says, unless it says the same. Of two overrides of one occurrence the later one
+  // counts.
+  void add(ICalReadItem& read) {
+    Item item{&read, identifier_ + *read.key, {}};
+    auto known = positions_.find(item.identifier);
+    if (known != positions_.end() && !read.overrides && !read.uid.empty()) {
+      if (read.contentHash != items_[known->second].read->contentHash) {
+        item.identifier += "/copy-" + read.contentHash;
+        known = positions_.find(item.identifier);
+        if (known == positions_.end()) {
+          warnings_.note(read.source, read.uidLine,
+                         "UID " + read.uid + " is given twice: kept as a second " +
+                             (read.event ? "event" : "task"));
+        }
+      }
+    } else if (known != positions_.end() && read.overrides && !read.uid.empty()) {
+      warnings_.note(
+          read.source, read.uidLine,
+          "UID " + read.uid + " overrides the same occurrence twice: the later one counts");
+    }
+    if (known == positions_.end()) {
+      positions_.emplace(item.identifier, items_.size());
+      items_.push_back(std::move(item));
+    } else {
+      items_[known->second] = std::move(item);
+    }
+  }
+
+  // RFC 5545 section 3.8.4.4: a component with a RECURRENCE-ID replaces one occurrence of
+  // the component with the same UID and none; the master lists it as a detached event.
+  void linkOverrides() {
+    std::map<std::pair<bool, std::string>, std::size_t> masters;
+    for (std::size_t i = 0; i < items_.size(); ++i) {
+      const ICalReadItem& read = *items_[i].read;
+      if (!read.overrides && !read.uid.empty()) {
+        masters.emplace(std::make_pair(read.event, read.uid), i);
+      }
+    }
+    for (Item& item : items_) {
+      const ICalReadItem& read = *item.read;
+      if (!read.overrides || !read.event || read.uid.empty()) continue;
+      const auto master = masters.find({read.event, read.uid});
+      if (master != masters.end()) {
+        items_[master->second].detached.emplace_back(item.identifier, read.dropped);
+      }
+    }
+  }
+
+  void append(Item& item, std::vector<Record>& records) const {
+    ICalReadItem& read = *item.read;
+    Dictionary record = std::move(read.record);
+    const auto setRelationship = [&](std::string_view key, const std::vector<std::string>& ids) {
+      if (ids.empty()) return;
+      Array array;
+      for (const std::string& id : ids) array.emplace_back(item.identifier + id);
+      record.set(key, Value(std::move(array)));
+    };
+    setRelationship(TesselRelationship_Calendars_Event_Recurrences, read.recurrences);
+    setRelationship(TesselRelationship_Calendars_Event_AudioAlarms, read.audioAlarms);
+    setRelationship(TesselRelationship_Calendars_Event_MailAlarms, read.mailAlarms);
+    setRelationship(TesselRelationship_Calendars_Event_DisplayAlarms, read.displayAlarms);
+    setRelationship(TesselRelationship_Calendars_Event_Organizer, read.organizer);
+    setRelationship(TesselRelationship_Calendars_Event_Attendees, read.attendees);
+    // A master does not list the overrides that were dropped.
+    std::vector<std::string> kept;
+    for (const auto& [id, dropped] : item.detached) {
+      if (!dropped) kept.push_back(id);
+    }
+    if (!kept.empty()) {
+      record.set(TesselRelationship_Calendars_Event_DetachedEvents, Value(relationship(kept)));
+    }
+    record.set(TesselRelationship_Calendars_Event_Calendar, Value(relationship({identifier_})));
+
+    records.push_back({item.identifier, std::move(record)});
+    for (auto& [suffix, sub] : read.related) {
+      records.push_back({item.identifier + suffix, std::move(sub)});
+    }
+    read.related.clear();
   }
 
   ICalParsedFiles& files_;
@@ -420,21 +456,10 @@ class CalendarBuilder {
 
 ICalParsedFiles parseICalFiles(std::vector<ICalFile> files, ImportWarnings& warnings) {
   ICalParsedFiles parsed;
-  parsed.documents.reserve(files.size());
+  FileItemsReader reader(parsed);
   for (ICalFile& file : files) {
-    parsed.documents.push_back(ICalDocument::parse(file.text, file.name, warnings));
-    std::string().swap(file.text);  // libical holds what is needed of it
-    for (icalcomponent* vcalendar : parsed.documents.back().calendars()) {
-      for (icalproperty* property : propertiesOf(vcalendar)) {
-        if (icalproperty_isa(property) != ICAL_X_PROPERTY) continue;
-        const char* name = icalproperty_get_x_name(property);
-        const std::string lower = name != nullptr ? lowerAscii(name) : std::string();
-        std::optional<std::string>* label = lower == "x-wr-calname"    ? &parsed.labels.name
-                                            : lower == "x-wr-relcalid" ? &parsed.labels.relationId
-                                                                       : nullptr;
-        if (label != nullptr && !*label) *label = text(icalproperty_get_x(property));
-      }
-    }
+    ICalDocument::read(file.text, file.name, warnings, reader);
+    std::string().swap(file.text);
   }
   return parsed;
 }

@@ -1,11 +1,14 @@
 #pragma once
 
+#include <cstddef>
 #include <optional>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "importers/ical_document.h"
 #include "importers/import_warnings.h"
+#include "platform/value.h"
 #include "tessel/record.h"
 
 namespace tessel::importers {
@@ -24,14 +27,41 @@ struct ICalCalendarLabels {
   std::optional<std::string> relationId;  // X-WR-RELCALID, the writer's identifier of it
 };
 
-// The files of one calendar as libical read them, kept until their records are made.
+// One VEVENT or VTODO of a calendar's files, read into records before the calendar's
+// identifier is known: the identifiers it holds are what follows the calendar's.
+struct ICalReadItem {
+  bool event = true;
+  std::string uid;
+  bool overrides = false;  // it has a RECURRENCE-ID
+  // Its identifier after the calendar's; none for one whose RECURRENCE-ID is unreadable,
+  // which is dropped.
+  std::optional<std::string> key;
+  // What it says, for telling a second component with its UID from a copy of it.
+  std::string contentHash;
+  std::string source;
+  std::optional<std::size_t> uidLine;
+  // The faults and notes met while it was identified, then while it became records.
+  ImportWarnings identifying{OnFault::Skip};
+  ImportWarnings reading{OnFault::Skip};
+  bool dropped = false;
+  // Its record without the relationships, and its sub-records, each after the item's
+  // identifier and listed in the relationship of its kind.
+  zt::platform::Dictionary record;
+  std::vector<std::pair<std::string, zt::platform::Dictionary>> related;
+  std::vector<std::string> recurrences, audioAlarms, mailAlarms, displayAlarms, organizer,
+      attendees;
+};
+
+// The files of one calendar read into records, kept until the calendar's identifier is
+// known.
 struct ICalParsedFiles {
-  std::vector<ICalDocument> documents;
+  std::vector<ICalReadItem> items;
   ICalCalendarLabels labels;
 };
 
-// Parses the files, releasing the text of each once libical has read it. Faults go through
-// `warnings` (ICalDocument::parse), which outlives the result.
+// Reads the files, releasing the text of each once it is read. The faults of the text and
+// of libical's reading go through `warnings` (ICalDocument::read) file by file; those of
+// each item are reported by readICalCalendar.
 ICalParsedFiles parseICalFiles(std::vector<ICalFile> files, ImportWarnings& warnings);
 
 // One calendar read from its files, not yet written anywhere.

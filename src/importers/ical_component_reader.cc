@@ -17,9 +17,8 @@ ImportError ComponentReader::error(icalproperty* property, std::string reason) c
 }
 
 void ComponentReader::warn(icalproperty* property, std::string_view text) const {
-  std::optional<std::size_t> line = ICalDocument::lineOf(property);
-  if (!line) line = ICalDocument::lineOf(component_);
-  document_.warnings().note(document_.source(), line, std::string(text));
+  document_.warnings().note(document_.source(), document_.lineAt(property, component_),
+                            std::string(text));
 }
 
 void ComponentReader::drop(const ImportError& fault, icalproperty* property) const {

@@ -2,14 +2,17 @@
 
 #include <libical/ical.h>
 
+#include <algorithm>
 #include <charconv>
 #include <cstdlib>
 #include <map>
 #include <memory>
 #include <set>
+#include <tuple>
 #include <vector>
 
 #include "importers/ical_content_lines.h"
+#include "importers/ical_time_zones.h"
 #include "importers/ical_vcalendar.h"
 #include "importers/import_kind.h"
 #include "importers/physical_lines.h"
@@ -162,6 +165,11 @@ void collectErrors(icalcomponent* component,
   }
 }
 
+bool hasErrors(icalcomponent* component) {
+  icalcomponent* where = nullptr;
+  return firstError(component, &where) != nullptr;
+}
+
 // Every component by the line of its BEGIN. A VCALENDAR that the file left out shares its
 // line with the first component it holds, which is the one meant.
 void componentsByLine(icalcomponent* component, std::map<std::size_t, icalcomponent*>& byLine) {
@@ -174,76 +182,209 @@ void componentsByLine(icalcomponent* component, std::map<std::size_t, icalcompon
   }
 }
 
+// A content line kept until the component it belongs to is complete, with whether it was read
+// as vCalendar 1.0.
+struct HeldLine {
+  ICalContentLine line;
+  bool vCalendar = false;
+};
+
+// The lines of one component (or of a calendar's properties and time zones), in buffers that
+// are reused from one component to the next.
+class HeldLines {
+ public:
+  void clear() { size_ = 0; }
+  // Takes the text out of `line`.
+  const HeldLine& add(ICalContentLine& line, bool vCalendar) {
+    if (size_ == lines_.size()) lines_.emplace_back();
+    HeldLine& held = lines_[size_++];
+    held.line.kind = line.kind;
+    held.line.line = line.line;
+    held.line.name.assign(line.name);
+    held.line.text.swap(line.text);
+    held.vCalendar = vCalendar;
+    return held;
+  }
+  const HeldLine* begin() const { return lines_.data(); }
+  const HeldLine* end() const { return lines_.data() + size_; }
+
+ private:
+  std::vector<HeldLine> lines_;
+  std::size_t size_ = 0;
+};
+
+using PropertyLines = ICalDocument::PropertyLines;
+
+// Raised by lineAt about a property read without its line: the component is read again
+// with the lines, and its reading starts over.
+struct PropertyLinesNeeded {};
+
+bool isUid(std::string_view name) {
+  return name.size() == 3 && (name[0] == 'U' || name[0] == 'u') &&
+         (name[1] == 'I' || name[1] == 'i') && (name[2] == 'D' || name[2] == 'd');
+}
+
+// Hands one content line to libical as the whole file's reading did, the line of each
+// property as a parameter or not. The UID always keeps its line: a UID given twice is
+// only known once its component is gone.
+void feed(LineParser& parser, const HeldLine& held, PropertyLines propertyLines,
+          std::string& scratch) {
+  const ICalContentLine& line = held.line;
+  const auto property = [&](const ICalContentLine& each) {
+    if (propertyLines == PropertyLines::Tagged || isUid(each.name)) {
+      parser.add(taggedLine(each));
+    } else {
+      scratch.assign(each.text);
+      parser.add(scratch);
+    }
+  };
+  switch (line.kind) {
+    case ICalContentLine::Kind::Begin:
+      parser.add("BEGIN:" + line.name);
+      parser.add(std::string(kLineName) + ':' + std::to_string(line.line));
+      break;
+    case ICalContentLine::Kind::End:
+      parser.add("END:" + line.name);
+      break;
+    case ICalContentLine::Kind::Property:
+      if (isLineTag(line.name)) break;
+      if (!held.vCalendar) {
+        property(line);
+        break;
+      }
+      for (std::string& asICal : vCalendarAsICalendar(line)) {
+        const std::string name = asICal.substr(0, asICal.find_first_of(";:"));
+        if (name == "BEGIN" || name == "END") {
+          parser.add(asICal);
+          if (name == "BEGIN") {
+            parser.add(std::string(kLineName) + ':' + std::to_string(line.line));
+          }
+          continue;
+        }
+        property({ICalContentLine::Kind::Property, line.line, name, asICal});
+      }
+      break;
+  }
+}
+
+OwnedComponent parseLines(const HeldLines& lines, PropertyLines propertyLines) {
+  LineParser parser;
+  std::string scratch;
+  for (const HeldLine& held : lines) feed(parser, held, propertyLines, scratch);
+  return parser.root();
+}
+
+// A fault of libical's reading, kept until the whole file was read: the reading of the whole
+// file at once reported the lines libical refuses in line order, then what libical still found
+// wrong in the order of the components (their lines, the calendar before what it holds).
+struct DeferredFault {
+  std::size_t line;
+  std::size_t depth;
+  ImportError fault;
+  std::string consequence;
+};
+
+struct DeferredFaults {
+  std::vector<DeferredFault> lines;
+  std::vector<DeferredFault> components;
+
+  void passOn(ImportWarnings& warnings) {
+    const auto byPlace = [](const DeferredFault& a, const DeferredFault& b) {
+      return std::tie(a.line, a.depth) < std::tie(b.line, b.depth);
+    };
+    std::stable_sort(lines.begin(), lines.end(), byPlace);
+    std::stable_sort(components.begin(), components.end(), byPlace);
+    for (const DeferredFault& each : lines) warnings.fault(each.fault, each.consequence);
+    for (const DeferredFault& each : components) warnings.fault(each.fault, each.consequence);
+    lines.clear();
+    components.clear();
+  }
+};
+
+std::size_t depthOf(icalcomponent* component) {
+  std::size_t depth = 0;
+  for (icalcomponent* parent = icalcomponent_get_parent(component); parent != nullptr;
+       parent = icalcomponent_get_parent(parent)) {
+    ++depth;
+  }
+  return depth;
+}
+
 // libical leaves out each property it cannot read, and puts an X-LIC-ERROR in its place
 // that names neither its line nor its component. libical reads a property the same way
 // wherever it stands, so a line it refuses inside the file it also refuses alone: each line
-// is parsed alone once the whole file showed a fault (most files have none and are parsed
-// once), and each it refuses is a fault at its line, in the component it stands in.
-// Whatever libical still found wrong is a fault at the component it concerns.
-void reportUnreadLines(std::string_view text, const std::string& source, icalcomponent* root,
-                       ImportWarnings& warnings) {
+// of `root` (read from `lines`, `depth` components deep in its calendar) is parsed alone once
+// libical's reading of it showed a fault (most components have none and are parsed once),
+// and each it refuses is a fault at its line, in the component it stands in. Whatever
+// libical still found wrong is a fault at the component it concerns. Answers whether `root`
+// itself is dropped: an event without its start.
+bool reportUnreadLines(const HeldLines& lines, const std::string& source, icalcomponent* root,
+                       std::size_t depth, DeferredFaults& faults) {
   std::vector<std::pair<icalcomponent*, icalproperty*>> errors;
   collectErrors(root, errors);
-  if (errors.empty()) return;
+  if (errors.empty()) return false;
   std::map<std::size_t, icalcomponent*> byLine;
   componentsByLine(root, byLine);
   std::map<icalcomponent*, std::size_t> explained;
-  // The faults of the text itself were reported when libical was fed; this reading only
-  // looks for the lines libical refuses.
-  ImportWarnings again(OnFault::Skip);
   std::vector<std::size_t> begins;
   std::set<icalcomponent*> startless, triggerless;
-  bool vCalendar = false;
-  forEachICalContentLine(
-      text, source,
-      [&](const ICalContentLine& line) {
-        if (line.kind == ICalContentLine::Kind::Begin) return begins.push_back(line.line);
-        if (line.kind == ICalContentLine::Kind::End) return begins.pop_back();
-        if (isLineTag(line.name)) return;
-        if (std::optional<bool> version = isVCalendarVersion(line)) vCalendar = *version;
-        std::optional<std::string> complaint;
-        for (const std::string& asICal :
-             vCalendar ? vCalendarAsICalendar(line) : std::vector<std::string>{line.text}) {
-          if (!asICal.starts_with("BEGIN:") && !asICal.starts_with("END:") && !complaint) {
-            complaint = complaintAbout(asICal);
-          }
-        }
-        if (!complaint) return;
-        icalcomponent* component = nullptr;
-        if (!begins.empty()) {
-          auto found = byLine.find(begins.back());
-          if (found != byLine.end()) component = found->second;
-        }
-        if (component != nullptr) ++explained[component];
-        const std::string name = zt::platform::upperAscii(line.name);
-        // An event is where and when it starts: without its start it is dropped as a whole.
-        if (component != nullptr && name == "DTSTART" &&
-            icalcomponent_isa(component) == ICAL_VEVENT_COMPONENT) {
-          warnings.fault(ImportError(source, line.line, name + ": " + *complaint),
-                         "dropped " + ICalDocument::describe(component));
-          startless.insert(component);
-          return;
-        }
-        // An alarm is when it rings: without its trigger the reader has nothing of it.
-        if (component != nullptr && name == "TRIGGER" &&
-            icalcomponent_isa(component) == ICAL_VALARM_COMPONENT) {
-          warnings.fault(ImportError(source, line.line, name + ": " + *complaint),
-                         "dropped " + ICalDocument::describe(component));
-          triggerless.insert(component);
-          return;
-        }
-        warnings.fault(ImportError(source, line.line, name + ": " + *complaint),
-                       "dropped the " + name +
-                           (component != nullptr ? " of " + ICalDocument::describe(component)
-                                                 : std::string()));
-      },
-      again);
+  const auto fault = [&](std::size_t line, ImportError error, std::string consequence) {
+    faults.lines.push_back({line, 0, std::move(error), std::move(consequence)});
+  };
+  for (const HeldLine& held : lines) {
+    const ICalContentLine& line = held.line;
+    if (line.kind == ICalContentLine::Kind::Begin) {
+      begins.push_back(line.line);
+      continue;
+    }
+    if (line.kind == ICalContentLine::Kind::End) {
+      begins.pop_back();
+      continue;
+    }
+    if (isLineTag(line.name)) continue;
+    std::optional<std::string> complaint;
+    for (const std::string& asICal :
+         held.vCalendar ? vCalendarAsICalendar(line) : std::vector<std::string>{line.text}) {
+      if (!asICal.starts_with("BEGIN:") && !asICal.starts_with("END:") && !complaint) {
+        complaint = complaintAbout(asICal);
+      }
+    }
+    if (!complaint) continue;
+    icalcomponent* component = nullptr;
+    if (!begins.empty()) {
+      auto found = byLine.find(begins.back());
+      if (found != byLine.end()) component = found->second;
+    }
+    if (component != nullptr) ++explained[component];
+    const std::string name = zt::platform::upperAscii(line.name);
+    // An event is where and when it starts: without its start it is dropped as a whole.
+    if (component != nullptr && name == "DTSTART" &&
+        icalcomponent_isa(component) == ICAL_VEVENT_COMPONENT) {
+      fault(line.line, ImportError(source, line.line, name + ": " + *complaint),
+            "dropped " + ICalDocument::describe(component));
+      startless.insert(component);
+      continue;
+    }
+    // An alarm is when it rings: without its trigger the reader has nothing of it.
+    if (component != nullptr && name == "TRIGGER" &&
+        icalcomponent_isa(component) == ICAL_VALARM_COMPONENT) {
+      fault(line.line, ImportError(source, line.line, name + ": " + *complaint),
+            "dropped " + ICalDocument::describe(component));
+      triggerless.insert(component);
+      continue;
+    }
+    fault(line.line, ImportError(source, line.line, name + ": " + *complaint),
+          "dropped the " + name +
+              (component != nullptr ? " of " + ICalDocument::describe(component) : std::string()));
+  }
   for (const auto& [component, error] : errors) {
     if (explained[component] > 0) {
       --explained[component];
     } else {
-      warnings.fault(ImportError(source, ICalDocument::lineOf(component), errorText(error)),
-                     "libical left it out of " + ICalDocument::describe(component));
+      const std::optional<std::size_t> line = ICalDocument::lineOf(component);
+      faults.components.push_back({line.value_or(0), depth + depthOf(component),
+                                   ImportError(source, line, errorText(error)),
+                                   "libical left it out of " + ICalDocument::describe(component)});
     }
     icalcomponent_remove_property(component, error);
     icalproperty_free(error);
@@ -262,10 +403,16 @@ void reportUnreadLines(std::string_view text, const std::string& source, icalcom
     }
     if (!inDropped) outermost.push_back(component);
   }
+  bool rootDropped = false;
   for (icalcomponent* component : outermost) {
+    if (component == root) {
+      rootDropped = true;
+      continue;
+    }
     icalcomponent_remove_component(icalcomponent_get_parent(component), component);
     icalcomponent_free(component);
   }
+  return rootDropped;
 }
 
 // The text in UTF-8. RFC 5545 section 3.1.4 wants UTF-8, but some programs write their
@@ -296,96 +443,178 @@ std::optional<std::string> windows1252Text(std::string_view text, const std::str
 
 }  // namespace
 
-ICalDocument ICalDocument::parse(std::string_view input, std::string source,
-                                 ImportWarnings& warnings) {
+namespace {
+
+// The reading of one file: first the properties and time zones of each calendar (the time
+// zones that its items name may come after them, RFC 5545 section 3.6 does not order
+// components), then each top-level component of each calendar alone, freed before the next.
+class FileReader {
+ public:
+  FileReader(std::string_view text, const std::string& source, ImportWarnings& warnings)
+      : text_(text), document_(source, warnings), warnings_(warnings) {}
+
+  // The calendars' properties and time zones; the faults of the text go through the
+  // warnings as they are met.
+  void readCalendars(ImportWarnings& warnings) {
+    HeldLines held;
+    std::string scratch;
+    std::unique_ptr<LineParser> parser;
+    std::size_t depth = 0;
+    bool inZone = false;
+    bool vCalendar = false;
+    forEachICalContentLine(
+        text_, document_.source(),
+        [&](ICalContentLine& line) {
+          const bool property = line.kind == ICalContentLine::Kind::Property;
+          if (property && !isLineTag(line.name)) {
+            // VERSION:1.0 says the calendar is a vCalendar; it comes before the components.
+            if (std::optional<bool> version = isVCalendarVersion(line)) vCalendar = *version;
+          }
+          if (line.kind == ICalContentLine::Kind::Begin) {
+            if (depth == 0) {
+              held.clear();
+              parser = std::make_unique<LineParser>();
+            }
+            if (depth == 1) inZone = line.name == "VTIMEZONE";
+            ++depth;
+            if (depth > 1 && !inZone) return;
+          } else if (line.kind == ICalContentLine::Kind::End) {
+            --depth;
+            if (depth > 0 && !inZone) return;
+            if (depth == 1) inZone = false;
+          } else if (depth > 1 && !inZone) {
+            return;
+          }
+          feed(*parser, held.add(line, vCalendar), PropertyLines::Tagged, scratch);
+          if (depth > 0) return;
+          OwnedComponent calendar = parser->root();
+          parser.reset();
+          if (!calendar) throw ImportError(document_.source(), 1, "libical cannot read this file");
+          reportUnreadLines(held, document_.source(), calendar.get(), 0, faults_);
+          calendars_.push_back(std::move(calendar));
+        },
+        warnings);
+    for (std::size_t i = 0; i < calendars_.size(); ++i) {
+      zones_.push_back(
+          std::make_unique<ICalTimeZones>(calendars_[i].get(), [this, i] { return itemYears(i); }));
+    }
+  }
+
+  // Each calendar, then its events and tasks, into `visitor`.
+  void readItems(ICalDocumentVisitor& visitor) {
+    forEachTopComponent(
+        std::nullopt,
+        [&](std::size_t calendar) {
+          visitor.calendar(document_, calendars_[calendar].get(), *zones_[calendar]);
+        },
+        [&](icalcomponent* component, PropertyLines propertyLines) {
+          const icalcomponent_kind kind = icalcomponent_isa(component);
+          if (kind == ICAL_VEVENT_COMPONENT || kind == ICAL_VTODO_COMPONENT) {
+            visitor.item(ICalDocument(document_.source(), warnings_, propertyLines), component);
+          }
+        },
+        faults_);
+  }
+
+  // libical's faults, in the order the reading of the whole file reported them.
+  void passOnFaults(ImportWarnings& warnings) { faults_.passOn(warnings); }
+
+ private:
+  // The years the top-level components of one calendar start in, read again (only a zone
+  // known by its rules alone asks).
+  std::vector<int> itemYears(std::size_t calendar) {
+    std::vector<int> years;
+    DeferredFaults ignored;
+    forEachTopComponent(
+        calendar, [](std::size_t) {},
+        [&](icalcomponent* component, PropertyLines) {
+          icalproperty* start = icalcomponent_get_first_property(component, ICAL_DTSTART_PROPERTY);
+          years.push_back(start != nullptr ? icalproperty_get_dtstart(start).year : 0);
+        },
+        ignored);
+    return years;
+  }
+
+  // Each top-level component of the calendars but their time zones (of the one calendar
+  // `only` when given), parsed alone.
+  template <typename OnCalendar, typename OnComponent>
+  void forEachTopComponent(std::optional<std::size_t> only, OnCalendar&& onCalendar,
+                           OnComponent&& onComponent, DeferredFaults& faults) {
+    // The faults of the text were reported by readCalendars.
+    ImportWarnings again(OnFault::Skip);
+    HeldLines held;
+    std::size_t depth = 0;
+    std::size_t calendar = 0;
+    bool wanted = false;
+    bool inComponent = false;
+    bool vCalendar = false;
+    forEachICalContentLine(
+        text_, document_.source(),
+        [&](ICalContentLine& line) {
+          if (line.kind == ICalContentLine::Kind::Property && !isLineTag(line.name)) {
+            if (std::optional<bool> version = isVCalendarVersion(line)) vCalendar = *version;
+          }
+          if (line.kind == ICalContentLine::Kind::Begin) {
+            ++depth;
+            if (depth == 1) {
+              wanted = !only || *only == calendar;
+              if (wanted) onCalendar(calendar);
+              ++calendar;
+              return;
+            }
+            if (depth == 2) {
+              inComponent = wanted && line.name != "VTIMEZONE";
+              if (inComponent) held.clear();
+            }
+          } else if (line.kind == ICalContentLine::Kind::End) {
+            --depth;
+          }
+          if (!inComponent || depth == 0) return;
+          held.add(line, vCalendar);
+          if (depth > 1) return;
+          inComponent = false;
+          // Most components hold nothing libical refuses, and their faults, if any, need
+          // no line of a property: they are read without, and read again when they do.
+          OwnedComponent component = parseLines(held, PropertyLines::Untagged);
+          if (!component) return;
+          PropertyLines propertyLines = PropertyLines::Untagged;
+          if (hasErrors(component.get())) {
+            component = parseLines(held, PropertyLines::Tagged);
+            propertyLines = PropertyLines::Tagged;
+          }
+          if (reportUnreadLines(held, document_.source(), component.get(), 1, faults)) return;
+          try {
+            onComponent(component.get(), propertyLines);
+          } catch (const PropertyLinesNeeded&) {
+            component = parseLines(held, PropertyLines::Tagged);
+            onComponent(component.get(), PropertyLines::Tagged);
+          }
+        },
+        again);
+  }
+
+  std::string_view text_;
+  ICalDocument document_;
+  ImportWarnings& warnings_;
+  std::vector<OwnedComponent> calendars_;
+  std::vector<std::unique_ptr<ICalTimeZones>> zones_;
+  DeferredFaults faults_;
+};
+
+}  // namespace
+
+void ICalDocument::read(std::string_view input, const std::string& source, ImportWarnings& warnings,
+                        ICalDocumentVisitor& visitor) {
   checkImportKind(input, ImportKind::ICalendar, source);
   const std::optional<std::string> converted = windows1252Text(input, source, warnings);
   const std::string_view text = converted ? std::string_view(*converted) : input;
   // A libical built with ICAL_ERRORS_ARE_FATAL aborts on the first value it cannot read;
   // here such a value is a fault to report with its line.
   icalerror_set_errors_are_fatal(0);
-  LineParser parser;
-  // The lines go to libical as they are read, each checked one, so that neither the
-  // unfolded text nor its lines are held beside libical's components.
-  std::string tagged;
-  // VERSION:1.0 says the calendar is a vCalendar; it comes before the components.
-  bool vCalendar = false;
-  forEachICalContentLine(
-      text, source,
-      [&](const ICalContentLine& line) {
-        switch (line.kind) {
-          case ICalContentLine::Kind::Begin:
-            parser.add("BEGIN:" + line.name);
-            parser.add(std::string(kLineName) + ':' + std::to_string(line.line));
-            break;
-          case ICalContentLine::Kind::End:
-            parser.add("END:" + line.name);
-            break;
-          case ICalContentLine::Kind::Property:
-            if (isLineTag(line.name)) break;
-            if (std::optional<bool> version = isVCalendarVersion(line)) vCalendar = *version;
-            if (!vCalendar) {
-              tagged = taggedLine(line);
-              parser.add(tagged);
-              break;
-            }
-            for (std::string& asICal : vCalendarAsICalendar(line)) {
-              const std::string name = asICal.substr(0, asICal.find_first_of(";:"));
-              if (name == "BEGIN" || name == "END") {
-                parser.add(asICal);
-                if (name == "BEGIN") {
-                  parser.add(std::string(kLineName) + ':' + std::to_string(line.line));
-                }
-                continue;
-              }
-              tagged = taggedLine({ICalContentLine::Kind::Property, line.line, name, asICal});
-              parser.add(tagged);
-            }
-            break;
-        }
-      },
-      warnings);
-
-  OwnedComponent root = parser.root();
-  if (!root) throw ImportError(source, 1, "libical cannot read this file");
-  reportUnreadLines(text, source, root.get(), warnings);
-  const icalcomponent_kind kind = icalcomponent_isa(root.get());
-  if (kind != ICAL_VCALENDAR_COMPONENT && kind != ICAL_XROOT_COMPONENT) {
-    throw ImportError(source, lineOf(root.get()), "no VCALENDAR in this file");
-  }
-  return ICalDocument(root.release(), std::move(source), warnings);
-}
-
-ICalDocument::ICalDocument(ICalDocument&& other) noexcept
-    : root_(std::exchange(other.root_, nullptr)),
-      source_(std::move(other.source_)),
-      warnings_(other.warnings_) {}
-
-ICalDocument& ICalDocument::operator=(ICalDocument&& other) noexcept {
-  if (this != &other) {
-    if (root_ != nullptr) icalcomponent_free(root_);
-    root_ = std::exchange(other.root_, nullptr);
-    source_ = std::move(other.source_);
-    warnings_ = other.warnings_;
-  }
-  return *this;
-}
-
-ICalDocument::~ICalDocument() {
-  if (root_ != nullptr) icalcomponent_free(root_);
-}
-
-std::vector<icalcomponent*> ICalDocument::calendars() const {
-  std::vector<icalcomponent*> calendars;
-  if (icalcomponent_isa(root_) == ICAL_VCALENDAR_COMPONENT) {
-    calendars.push_back(root_);
-    return calendars;
-  }
-  for (icalcompiter it = icalcomponent_begin_component(root_, ICAL_VCALENDAR_COMPONENT);
-       icalcompiter_deref(&it) != nullptr; icalcompiter_next(&it)) {
-    calendars.push_back(icalcompiter_deref(&it));
-  }
-  return calendars;
+  FileReader reader(text, source, warnings);
+  reader.readCalendars(warnings);
+  reader.readItems(visitor);
+  reader.passOnFaults(warnings);
 }
 
 std::optional<std::size_t> ICalDocument::lineOf(icalproperty* property) {
@@ -412,10 +641,6 @@ std::optional<std::size_t> ICalDocument::lineOf(icalcomponent* component) {
     }
   }
   return std::nullopt;
-}
-
-bool ICalDocument::isLineMark(std::string_view name) {
-  return name == kLineName;
 }
 
 std::string ICalDocument::describe(icalcomponent* component) {
@@ -459,11 +684,23 @@ std::string ICalDocument::describe(icalcomponent* component) {
   }
 }
 
+std::optional<std::size_t> ICalDocument::lineAt(icalproperty* property,
+                                                icalcomponent* component) const {
+  std::optional<std::size_t> line = lineOf(property);
+  if (!line && property != nullptr && propertyLines_ == PropertyLines::Untagged) {
+    throw PropertyLinesNeeded();
+  }
+  if (!line) line = lineOf(component);
+  return line;
+}
+
 ImportError ICalDocument::errorAt(icalproperty* property, icalcomponent* component,
                                   std::string reason) const {
-  std::optional<std::size_t> line = lineOf(property);
-  if (!line) line = lineOf(component);
-  return ImportError(source_, line, std::move(reason));
+  return ImportError(source_, lineAt(property, component), std::move(reason));
+}
+
+bool ICalDocument::isLineMark(std::string_view name) {
+  return name == kLineName;
 }
 
 }  // namespace tessel::importers

@@ -5,8 +5,8 @@
 #include <string>
 #include <string_view>
 #include <utility>
-#include <vector>
 
+#include "importers/ical_document_visitor.h"
 #include "importers/import_error.h"
 #include "importers/import_warnings.h"
 
@@ -16,33 +16,46 @@ struct icalproperty_impl;
 
 namespace tessel::importers {
 
-// One iCalendar file parsed by libical, after every content line was checked on its own so
-// that a fault is reported with its line. Each property and component remembers the line it
-// came from (lineOf), for the messages of later checks, and the faults of those checks go
-// through the document's warnings.
+// One iCalendar file read by libical one component at a time: each content line is checked
+// on its own, so that a fault is reported with its line, and each property and component
+// remembers the line it came from (lineOf), for the messages of later checks. Libical never
+// holds more of the file than the properties and time zones of its calendars and one event
+// or task.
 class ICalDocument {
  public:
-  // Each fault goes through `warnings` (which outlives the document): a property libical
-  // cannot read is left out, and so are the lines of forEachICalContentLine's faults; text
-  // that is not UTF-8 is read as Windows-1252. Raises ImportError naming `source` for a file
-  // that is not an iCalendar file or that libical cannot read at all.
-  static ICalDocument parse(std::string_view text, std::string source, ImportWarnings& warnings);
+  // Reads `text` into `visitor`. Each fault goes through `warnings` (which outlives the
+  // document), the faults of the text and libical's in file order once the whole file was
+  // read: a property libical cannot read is left out, and so are the lines of
+  // forEachICalContentLine's faults; text that is not UTF-8 is read as Windows-1252. Raises
+  // ImportError naming `source` for a file that is not an iCalendar file or that libical
+  // cannot read at all.
+  static void read(std::string_view text, const std::string& source, ImportWarnings& warnings,
+                   ICalDocumentVisitor& visitor);
 
-  ICalDocument(ICalDocument&& other) noexcept;
-  ICalDocument& operator=(ICalDocument&& other) noexcept;
-  ICalDocument(const ICalDocument&) = delete;
-  ICalDocument& operator=(const ICalDocument&) = delete;
-  ~ICalDocument();
+  // Whether the properties libical read carry the line they came from (components and UIDs
+  // always do). Most components are read without, which is faster; lineAt then asks for the
+  // component to be read again with them.
+  enum class PropertyLines { Tagged, Untagged };
+
+  // A document of the file `source` whose later faults go through `warnings`.
+  ICalDocument(std::string source, ImportWarnings& warnings,
+               PropertyLines propertyLines = PropertyLines::Tagged)
+      : source_(std::move(source)), warnings_(&warnings), propertyLines_(propertyLines) {}
+  // The same document, whose later faults go through `warnings`.
+  ICalDocument(const ICalDocument& document, ImportWarnings& warnings)
+      : source_(document.source_), warnings_(&warnings), propertyLines_(document.propertyLines_) {}
 
   const std::string& source() const { return source_; }
-  // The VCALENDAR objects of the file, in file order (a file may hold more than one).
-  std::vector<icalcomponent_impl*> calendars() const;
 
   // The line a property or component starts on; none for what libical made up itself.
   static std::optional<std::size_t> lineOf(icalproperty_impl* property);
   static std::optional<std::size_t> lineOf(icalcomponent_impl* component);
   // Whether a parameter or property of this name is the line mark, not data.
   static bool isLineMark(std::string_view name);
+  // The line of `property`, else of `component` (when the property is null or libical made
+  // it up).
+  std::optional<std::size_t> lineAt(icalproperty_impl* property,
+                                    icalcomponent_impl* component) const;
 
   // An ImportError about this file at the line of `property` (or of `component` when the
   // property is null).
@@ -56,12 +69,9 @@ class ICalDocument {
   static std::string describe(icalcomponent_impl* component);
 
  private:
-  ICalDocument(icalcomponent_impl* root, std::string source, ImportWarnings& warnings)
-      : root_(root), source_(std::move(source)), warnings_(&warnings) {}
-
-  icalcomponent_impl* root_ = nullptr;
   std::string source_;
   ImportWarnings* warnings_;
+  PropertyLines propertyLines_;
 };
 
 }  // namespace tessel::importers

@@ -336,8 +336,7 @@ std::vector<ICalCalendar> readICalendarPaths(std::vector<ICalPath> paths,
     const auto same = std::find_if(pending.begin(), pending.end(),
                                    [&](const Pending& p) { return p.identifier == identifier; });
     if (same != pending.end()) {
-      for (ICalDocument& document : path.files.documents)
-        same->files.documents.push_back(std::move(document));
+      for (ICalReadItem& item : path.files.items) same->files.items.push_back(std::move(item));
       continue;
     }
     if (std::none_of(known.begin(), known.end(),

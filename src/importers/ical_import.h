@@ -45,7 +45,7 @@ struct ICalPath {
 };
 
 // Parses every path: a file, or every *.ics file of a folder. Needs no store. Faults go
-// through `warnings` (ICalDocument::parse), which outlives the result; a path that is
+// through `warnings` (parseICalFiles), which outlives the result; a path that is
 // neither a file nor a folder, a folder without any .ics file, or a file that cannot be read
 // or is not an iCalendar file raises ImportError.
 std::vector<ICalPath> parseICalendarPaths(const std::vector<std::filesystem::path>& paths,

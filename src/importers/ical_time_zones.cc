@@ -8,6 +8,7 @@
 #include <cstdlib>
 #include <functional>
 #include <tuple>
+#include <utility>
 #include <vector>
 
 #include "importers/ical_windows_zone.h"
@@ -350,24 +351,36 @@ std::optional<TimeZone> unnamedZoneOfVTimezone(icalcomponent* vtimezone) {
   return unnamedZoneOfObservances(observancesOf(vtimezone), 9999);
 }
 
-ICalTimeZones::ICalTimeZones(icalcomponent* calendar) {
+ICalTimeZones::ICalTimeZones(icalcomponent* calendar, ItemYears itemYears)
+    : itemYears_(std::move(itemYears)) {
   for (icalcompiter it = icalcomponent_begin_component(calendar, ICAL_ANY_COMPONENT);
        icalcompiter_deref(&it) != nullptr; icalcompiter_next(&it)) {
     icalcomponent* component = icalcompiter_deref(&it);
     if (icalcomponent_isa(component) != ICAL_VTIMEZONE_COMPONENT) {
       // The years the calendar's items start in, over which zones are matched by their rules.
       icalproperty* start = icalcomponent_get_first_property(component, ICAL_DTSTART_PROPERTY);
-      const int year = start != nullptr ? icalproperty_get_dtstart(start).year : 0;
-      if (year >= kFirstMatchedYear && year <= kLastMatchedYear) {
-        firstYear_ = firstYear_ == 0 ? year : std::min(firstYear_, year);
-        lastYear_ = std::max(lastYear_, year);
-      }
+      addYear(start != nullptr ? icalproperty_get_dtstart(start).year : 0);
       continue;
     }
     icalproperty* tzid = icalcomponent_get_first_property(component, ICAL_TZID_PROPERTY);
     const char* name = tzid != nullptr ? icalproperty_get_tzid(tzid) : nullptr;
     // The first definition of a TZID counts.
     if (name != nullptr) definitions_.emplace(name, component);
+  }
+}
+
+void ICalTimeZones::addYear(int year) {
+  if (year >= kFirstMatchedYear && year <= kLastMatchedYear) {
+    firstYear_ = firstYear_ == 0 ? year : std::min(firstYear_, year);
+    lastYear_ = std::max(lastYear_, year);
+  }
+}
+
+void ICalTimeZones::settleYears() {
+  if (yearsSettled_) return;
+  yearsSettled_ = true;
+  if (itemYears_) {
+    for (int year : itemYears_()) addYear(year);
   }
   if (firstYear_ == 0) {
     using namespace std::chrono;
@@ -384,7 +397,7 @@ std::optional<TimeZone> ICalTimeZones::zone(std::string_view tzid) {
   return found->second;
 }
 
-std::optional<TimeZone> ICalTimeZones::resolve(std::string_view tzid) const {
+std::optional<TimeZone> ICalTimeZones::resolve(std::string_view tzid) {
   // The IANA name, also in another case, with "_" for "/", or behind a vendor prefix.
   if (auto zone = namedZone(tzid)) return zone;
   const auto definition = definitions_.find(tzid);
@@ -421,6 +434,7 @@ std::optional<TimeZone> ICalTimeZones::resolve(std::string_view tzid) const {
     if (auto zone = TimeZone::named(*iana)) return zone;
   }
   if (vtimezone == nullptr) return std::nullopt;
+  settleYears();
   if (auto zone = zoneMatchingRules(vtimezone, firstYear_, lastYear_)) return zone;
   return unnamedZoneOfVTimezone(vtimezone);
 }

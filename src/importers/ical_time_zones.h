@@ -1,9 +1,11 @@
 #pragma once
 
+#include <functional>
 #include <map>
 #include <optional>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "platform/time_zone.h"
 
@@ -25,14 +27,23 @@ namespace tessel::importers {
 // - else an unnamed zone with the offsets and daylight rule of its VTIMEZONE.
 class ICalTimeZones {
  public:
-  // Keeps pointers into `calendar`, which must outlive it.
-  explicit ICalTimeZones(icalcomponent_impl* calendar);
+  // The years the items of a calendar start in (their first DTSTART), for a calendar whose
+  // items are read one by one rather than held in it.
+  using ItemYears = std::function<std::vector<int>()>;
+
+  // Keeps pointers into `calendar`, which must outlive it. The years of the items come from
+  // the components `calendar` holds and from `itemYears`, which is asked once, and only when
+  // a zone is matched by its rules.
+  explicit ICalTimeZones(icalcomponent_impl* calendar, ItemYears itemYears = {});
 
   // None when nothing defines the TZID.
   std::optional<zt::platform::TimeZone> zone(std::string_view tzid);
 
  private:
-  std::optional<zt::platform::TimeZone> resolve(std::string_view tzid) const;
+  std::optional<zt::platform::TimeZone> resolve(std::string_view tzid);
+  void addYear(int year);
+  // Settles the years over which zones are matched by their rules.
+  void settleYears();
 
   static constexpr int kFirstMatchedYear = 1970;
   static constexpr int kLastMatchedYear = 2037;
@@ -41,6 +52,8 @@ class ICalTimeZones {
   // The years over which zones known by their rules are matched.
   int firstYear_ = 0;
   int lastYear_ = 0;
+  ItemYears itemYears_;
+  bool yearsSettled_ = false;
   std::map<std::string, std::optional<zt::platform::TimeZone>, std::less<>> resolved_;
 };
 

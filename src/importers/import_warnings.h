@@ -42,9 +42,22 @@ class ImportWarnings {
   const std::vector<ImportWarning>& all() const { return warnings_; }
   std::size_t count() const { return warnings_.size(); }
 
+  // Hands each fault taken with OnFault::Skip and each note, in order, to `other`'s fault()
+  // and note(): a reader that meets them in another order than the import reports them keeps
+  // them here meanwhile.
+  void passOn(ImportWarnings& other) const;
+
  private:
+  // A fault, or a note when there is none.
+  struct Held {
+    std::optional<ImportError> fault;
+    std::string consequence;
+  };
+
   OnFault onFault_;
   std::vector<ImportWarning> warnings_;
+  // Beside each of warnings_.
+  std::vector<Held> held_;
 };
 
 }  // namespace tessel::importers

@@ -117,16 +117,31 @@ TEST(ICalZones, NamesWithoutVTimezone) {
 // name, and custom zones matched by their rules over the years the events use; a zone that
 // matches no zone of the database stays unnamed.
 TEST(ICalZones, NamesFromTheVTimezone) {
-  const ICalCalendar calendar = readZoneFile("by_vtimezone.ics");
-  const std::pair<std::string, std::string> cases[] = {
-      {"lisbon", "Europe/Lisbon"},         // X-LIC-LOCATION
-      {"office", "America/Chicago"},       // TZURL
-      {"customized", "America/New_York"},  // US rules since 2007, daylight time since 1970
-      {"down-under", "Australia/Sydney"},  // Australian rules, AEST/AEDT
-      {"outlook", "Europe/Berlin"},        // display name
-      {"nowhere", "UNNAMED 11820"},        // +03:17 is no zone's offset
-  };
-  for (const auto& [uid, zone] : cases) EXPECT_EQ(startZone(calendar, uid), zone) << uid;
+  // RFC 5545 does not order components: the same file with its VTIMEZONEs after the events
+  // that name them means the same zones.
+  ICalCalendarSource zonesLast;
+  zonesLast.identifier = "cal";
+  std::string text = zt::test_support::readFile(kZones / "by_vtimezone.ics");
+  std::string zones;
+  for (std::size_t begin; (begin = text.find("BEGIN:VTIMEZONE")) != std::string::npos;) {
+    const std::size_t end = text.find('\n', text.find("END:VTIMEZONE", begin)) + 1;
+    zones += text.substr(begin, end - begin);
+    text.erase(begin, end - begin);
+  }
+  text.insert(text.rfind("END:VCALENDAR"), zones);
+  zonesLast.files.push_back({"zones_last.ics", text});
+  for (const ICalCalendar& calendar :
+       {readZoneFile("by_vtimezone.ics"), readICalCalendar(zonesLast)}) {
+    const std::pair<std::string, std::string> cases[] = {
+        {"lisbon", "Europe/Lisbon"},         // X-LIC-LOCATION
+        {"office", "America/Chicago"},       // TZURL
+        {"customized", "America/New_York"},  // US rules since 2007, daylight time since 1970
+        {"down-under", "Australia/Sydney"},  // Australian rules, AEST/AEDT
+        {"outlook", "Europe/Berlin"},        // display name
+        {"nowhere", "UNNAMED 11820"},        // +03:17 is no zone's offset
+    };
+    for (const auto& [uid, zone] : cases) EXPECT_EQ(startZone(calendar, uid), zone) << uid;
+  }
 }
 
 }  // namespace
