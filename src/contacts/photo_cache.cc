@@ -39,6 +39,16 @@ std::uint64_t getNumber(const std::uint8_t*& at, int bytes) {
 }
 
 // The name of an entry of the cache's earlier form, one file per picture.
+std::string nameOf(const PhotoKey& key) {
+  static constexpr char kHex[] = "0123456789abcdef";
+  std::string name;
+  for (std::uint8_t byte : key) {
+    name += kHex[byte >> 4];
+    name += kHex[byte & 0xF];
+  }
+  return name;
+}
+
 bool isEntryName(std::string_view name) {
   return name.size() == 64 && name.find_first_not_of("0123456789abcdef") == std::string::npos;
 }
@@ -120,6 +130,10 @@ PhotoCache::PhotoCache(platform::FolderHandle folder, std::uint64_t sizeCap)
 void PhotoCache::load() {
   pack_.reset();
   packed_.clear();
+  earlierEntries_ = false;
+  if (platform::Result<std::vector<std::string>> listed = folder_.entries()) {
+    earlierEntries_ = std::any_of(listed->begin(), listed->end(), isEntryName);
+  }
   platform::Result<platform::FileReader> opened =
       platform::FileReader::open(folder_, std::string(kPackName));
   if (!opened) return;
@@ -187,7 +201,17 @@ std::optional<PhotoConversion> PhotoCache::find(const PhotoKey& key) {
     reader = &*pack_;
     slot = &found->second;
   }
-  if (!reader) return std::nullopt;
+  if (!reader) {
+    if (!earlierEntries_) return std::nullopt;
+    // A picture kept by the cache's earlier form, one file per picture, goes into the next
+    // pack instead of being converted again.
+    std::optional<platform::Data> earlier =
+        folder_.readFile(nameOf(key), kLargestEntry).valueOrNone();
+    std::optional<PhotoConversion> conversion;
+    if (earlier) conversion = decode(key, *earlier);
+    if (conversion) storeLocked(key, *conversion);
+    return conversion;
+  }
   platform::Data entry(static_cast<std::size_t>(slot->length));
   if (!reader->readAt(slot->offset, entry)) return std::nullopt;
   // The entry names its key and length itself: a damaged pack gives no other picture's
@@ -200,6 +224,10 @@ std::optional<PhotoConversion> PhotoCache::find(const PhotoKey& key) {
 void PhotoCache::store(const PhotoKey& key, const PhotoConversion& conversion) {
   if (!isLasting(conversion)) return;
   std::lock_guard lock(mutex_);
+  storeLocked(key, conversion);
+}
+
+void PhotoCache::storeLocked(const PhotoKey& key, const PhotoConversion& conversion) {
   // A damaged entry of the old pack is replaced, never copied.
   packed_.erase(key);
   if (stored_.contains(key) || nextFailed_) return;

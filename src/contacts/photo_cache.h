@@ -94,6 +94,8 @@ class PhotoCache {
   PhotoCache(platform::FolderHandle folder, std::uint64_t sizeCap);
   // Reads the index of the pack in place; a pack that cannot be read counts as empty.
   void load();
+  // store() with the lock held.
+  void storeLocked(const PhotoKey& key, const PhotoConversion& conversion);
   // Writes the index and puts the next pack in place, or removes the pack when nothing is
   // kept.
   void replacePack();
@@ -110,6 +112,8 @@ class PhotoCache {
   std::map<PhotoKey, Slot> stored_;
   std::uint64_t nextSize_ = 0;
   bool nextFailed_ = false;
+  // Whether the folder held entries of the cache's earlier form, one file per picture.
+  bool earlierEntries_ = false;
 };
 
 }  // namespace zt::contacts
