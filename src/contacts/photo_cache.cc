@@ -27,6 +27,12 @@ constexpr std::string_view kPackMagic = "ZTPACK01";
 constexpr std::size_t kIndexEntrySize = 32 + 8 + 8;
 constexpr std::size_t kTrailerSize = 8 + 8 + kPackMagic.size();
 
+// The keys by origin: the magic, their number, each origin's digest and key, then the SHA-256
+// of everything before it.
+constexpr std::string_view kKeysName = "keys";
+constexpr std::string_view kKeysMagic = "ZTKEYS01";
+constexpr std::size_t kLargestKeysFile = std::size_t{64} << 20;
+
 void putNumber(platform::Data& out, std::uint64_t value, int bytes) {
   for (int i = 0; i < bytes; ++i) out.push_back(static_cast<std::uint8_t>(value >> (8 * i)));
 }
@@ -97,6 +103,15 @@ std::optional<PhotoConversion> decode(const PhotoKey& key, const platform::Data&
   return conversion;
 }
 
+// Everything the conversion depends on besides the bytes: its version, the side and the
+// threshold, and the libvips (and so JPEG encoder) it was built with.
+std::string conversionContext() {
+  return "zetosynctool photo\n" + std::to_string(PhotoCache::kConversionVersion) + "\n" +
+         std::to_string(ContactPhotoPreparation::kSide) + "\n" +
+         std::to_string(ContactPhotoPreparation::kLargestEmbeddedJPEG) + "\n" +
+         std::string(platform::imageServiceIdentity()) + "\n";
+}
+
 }  // namespace
 
 bool isLasting(const PhotoConversion& conversion) {
@@ -125,6 +140,80 @@ std::unique_ptr<PhotoCache> PhotoCache::open(const std::filesystem::path& folder
 PhotoCache::PhotoCache(platform::FolderHandle folder, std::uint64_t sizeCap)
     : folder_(std::move(folder)), sizeCap_(sizeCap) {
   load();
+  loadRemembered();
+}
+
+void PhotoCache::loadRemembered() {
+  remembered_.clear();
+  std::optional<platform::Data> file =
+      folder_.readFile(std::string(kKeysName), kLargestKeysFile).valueOrNone();
+  constexpr std::size_t kFixed = kKeysMagic.size() + 8 + 32;
+  if (!file || file->size() < kFixed ||
+      std::memcmp(file->data(), kKeysMagic.data(), kKeysMagic.size()) != 0) {
+    return;
+  }
+  const std::uint8_t* at = file->data() + kKeysMagic.size();
+  const std::uint64_t count = getNumber(at, 8);
+  if ((file->size() - kFixed) % 64 != 0 || count != (file->size() - kFixed) / 64) return;
+  platform::Sha256 digest;
+  digest.update(std::span<const std::uint8_t>(file->data(), file->size() - 32));
+  const std::array<std::uint8_t, 32> sum = digest.finish();
+  if (std::memcmp(sum.data(), file->data() + file->size() - 32, 32) != 0) return;
+  for (std::uint64_t i = 0; i < count; ++i) {
+    OriginDigest origin;
+    PhotoKey key;
+    std::memcpy(origin.data(), at, origin.size());
+    std::memcpy(key.data(), at + origin.size(), key.size());
+    at += 64;
+    remembered_.insert_or_assign(origin, key);
+  }
+}
+
+void PhotoCache::saveRemembered() {
+  if (rememberedNow_ == remembered_) return;
+  if (rememberedNow_.empty()) {
+    (void)folder_.remove(std::string(kKeysName));
+    return;
+  }
+  platform::Data file;
+  file.reserve(kKeysMagic.size() + 8 + rememberedNow_.size() * 64 + 32);
+  for (char c : kKeysMagic) file.push_back(static_cast<std::uint8_t>(c));
+  putNumber(file, rememberedNow_.size(), 8);
+  for (const auto& [origin, key] : rememberedNow_) {
+    file.insert(file.end(), origin.begin(), origin.end());
+    file.insert(file.end(), key.begin(), key.end());
+  }
+  platform::Sha256 digest;
+  digest.update(file);
+  const std::array<std::uint8_t, 32> sum = digest.finish();
+  file.insert(file.end(), sum.begin(), sum.end());
+  (void)folder_.atomicWrite(std::string(kKeysName), file, platform::Durability::Unsynced);
+}
+
+PhotoKey PhotoCache::rememberedKeyFor(std::span<const std::uint8_t> picture,
+                                      const PictureOrigin& origin) {
+  // A key made under another conversion is never handed out.
+  std::string text = "zetosynctool photo origin\n" + conversionContext();
+  for (std::string_view field : {origin.store, origin.record}) {
+    text += std::to_string(field.size()) + ":";
+    text += field;
+    text += "\n";
+  }
+  text += std::to_string(origin.generation) + "\n" + std::to_string(picture.size()) + "\n";
+  platform::Sha256 digest;
+  digest.update(text);
+  const OriginDigest found = digest.finish();
+  {
+    std::lock_guard lock(mutex_);
+    if (auto it = remembered_.find(found); it != remembered_.end()) {
+      rememberedNow_.insert_or_assign(found, it->second);
+      return it->second;
+    }
+  }
+  const PhotoKey key = keyFor(picture);
+  std::lock_guard lock(mutex_);
+  rememberedNow_.insert_or_assign(found, key);
+  return key;
 }
 
 void PhotoCache::load() {
@@ -173,14 +262,8 @@ void PhotoCache::load() {
 }
 
 PhotoKey PhotoCache::keyFor(std::span<const std::uint8_t> picture) {
-  // Everything the conversion depends on besides the bytes: its version, the side and the
-  // threshold, and the libvips (and so JPEG encoder) it was built with.
-  std::string context = "zetosynctool photo\n" + std::to_string(kConversionVersion) + "\n" +
-                        std::to_string(ContactPhotoPreparation::kSide) + "\n" +
-                        std::to_string(ContactPhotoPreparation::kLargestEmbeddedJPEG) + "\n" +
-                        std::string(platform::imageServiceIdentity()) + "\n";
   platform::Sha256 digest;
-  digest.update(context);
+  digest.update(conversionContext());
   digest.update(picture);
   return digest.finish();
 }
@@ -309,6 +392,9 @@ void PhotoCache::replacePack() {
 void PhotoCache::prune() {
   std::lock_guard lock(mutex_);
   replacePack();
+  saveRemembered();
+  remembered_ = std::move(rememberedNow_);
+  rememberedNow_.clear();
   nextReader_.reset();
   stored_.clear();
   nextSize_ = 0;

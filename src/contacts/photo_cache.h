@@ -9,6 +9,7 @@
 #include <optional>
 #include <span>
 #include <string>
+#include <string_view>
 
 #include "platform/atomic_file.h"
 #include "platform/file_reader.h"
@@ -49,6 +50,14 @@ bool isLasting(const PhotoConversion& conversion);
 
 using PhotoKey = std::array<std::uint8_t, 32>;
 
+// Where a picture comes from: one record of one store at one generation, which within that
+// store file always holds the same bytes.
+struct PictureOrigin {
+  std::string_view store;  // the store file's identity (platform::fileIdentity)
+  std::string_view record;
+  std::int64_t generation = 0;
+};
+
 // Converted pictures kept between runs in one pack file in one folder, each entry found by
 // the SHA-256 of the picture's bytes and of everything else the conversion depends on. The
 // pack is read a piece at a time, never through a symbolic link; an entry whose bytes do not
@@ -56,7 +65,8 @@ using PhotoKey = std::array<std::uint8_t, 32>;
 // again, and a pack whose index cannot be read counts as empty. What a run stores goes to
 // the next pack, a temporary file beside it; at the end of a run that used the cache, prune()
 // adds the entries the run found in the old pack, up to the size cap, and puts the next pack
-// in place in one rename: entries the run did not use are forgotten. Every method may be
+// in place in one rename: entries the run did not use are forgotten. The keys of the pictures
+// are kept too, by origin, in a file checked whole by its own digest. Every method may be
 // called from several threads at once.
 class PhotoCache {
  public:
@@ -69,6 +79,11 @@ class PhotoCache {
 
   // The key of `picture` for this build's conversion.
   static PhotoKey keyFor(std::span<const std::uint8_t> picture);
+
+  // The key of `picture` from `origin`: the one kept from an earlier run for the same store,
+  // record, generation and picture size, else keyFor(picture), then kept for the next run.
+  // It spares reading every picture's bytes on every push.
+  PhotoKey rememberedKeyFor(std::span<const std::uint8_t> picture, const PictureOrigin& origin);
 
   std::optional<PhotoConversion> find(const PhotoKey& key);
   // Keeps a lasting conversion; failures to write are ignored.
@@ -94,6 +109,11 @@ class PhotoCache {
   PhotoCache(platform::FolderHandle folder, std::uint64_t sizeCap);
   // Reads the index of the pack in place; a pack that cannot be read counts as empty.
   void load();
+  using OriginDigest = std::array<std::uint8_t, 32>;
+  // The keys kept by the last run; one that cannot be read in full is no key at all.
+  void loadRemembered();
+  void saveRemembered();
+
   // store() with the lock held.
   void storeLocked(const PhotoKey& key, const PhotoConversion& conversion);
   // Writes the index and puts the next pack in place, or removes the pack when nothing is
@@ -112,6 +132,9 @@ class PhotoCache {
   std::map<PhotoKey, Slot> stored_;
   std::uint64_t nextSize_ = 0;
   bool nextFailed_ = false;
+  // Picture keys by origin: those of the last run, and those this run used or made.
+  std::map<OriginDigest, PhotoKey> remembered_;
+  std::map<OriginDigest, PhotoKey> rememberedNow_;
   // Whether the folder held entries of the cache's earlier form, one file per picture.
   bool earlierEntries_ = false;
 };

@@ -55,7 +55,8 @@ enum class Prefetch { No, Yes };
 using Threads = ContactPhotoPreparation::Threads;
 
 PhotoRun run(const std::vector<platform::Dictionary>& cards, std::unique_ptr<PhotoCache> cache,
-             Prefetch prefetch, Threads threads, bool serviceFails = false) {
+             Prefetch prefetch, Threads threads, bool serviceFails = false,
+             std::span<const PictureOrigin> origins = {}) {
   PhotoRun result;
   test_support::CapturedLog log;
   ContactPhotoPreparation preparation(
@@ -70,7 +71,7 @@ PhotoRun run(const std::vector<platform::Dictionary>& cards, std::unique_ptr<Pho
     std::vector<const Data*> pictures;
     for (const auto& card : cards)
       pictures.push_back(card.dataAt(tessel::TesselAttribute_Contacts_Contact_Image));
-    preparation.prefetch(pictures);
+    preparation.prefetch(pictures, origins);
   }
   for (const auto& card : cards) result.photos.push_back(preparation.photoForContact(card));
   preparation.finishRun();
@@ -124,6 +125,18 @@ TEST_F(PhotoCacheTest, EveryPathGivesTheBytesAndLinesOfAConversion) {
     EXPECT_EQ(again.log, converted_.log);
     EXPECT_EQ(again.servicesMade, 0) << "every picture comes from the cache";
   }
+}
+
+TEST_F(PhotoCacheTest, AKeyRememberedByOriginNeverGivesAnotherPicture) {
+  const std::vector<PictureOrigin> origins{{"store", "r0", 7}, {"store", "r1", 7}};
+  const std::vector<platform::Dictionary> two(cards_.begin(), cards_.begin() + 2);
+  const PhotoRun first = run(two, cache(), Prefetch::Yes, Threads::One, false, origins);
+  EXPECT_EQ(first.photos, std::vector(converted_.photos.begin(), converted_.photos.begin() + 2));
+  EXPECT_EQ(run(two, cache(), Prefetch::Yes, Threads::One, false, origins).servicesMade, 0);
+  // The same records and generations now hold each other's pictures (a store made again).
+  const std::vector<platform::Dictionary> swapped{cards_[1], cards_[0]};
+  const PhotoRun again = run(swapped, cache(), Prefetch::Yes, Threads::One, false, origins);
+  EXPECT_EQ(again.photos, (std::vector{converted_.photos[1], converted_.photos[0]}));
 }
 
 TEST_F(PhotoCacheTest, DamagedPacksAndLinksAreConvertedAgainAndReplaced) {
