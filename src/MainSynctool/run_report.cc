@@ -2,7 +2,9 @@
 
 #include <sys/stat.h>
 
+#include <algorithm>
 #include <cstdio>
+#include <functional>
 #include <map>
 #include <string_view>
 #include <system_error>
@@ -45,22 +47,38 @@ std::size_t replacedFiles(const std::map<std::string, FileStamp>& before,
   return count;
 }
 
-// The cards of a UTF-16BE vCard file: its BEGIN:VCARD lines.
+// The cards of a UTF-16BE vCard file: its BEGIN:VCARD lines. Read a piece at a time: the
+// file of a large address book is as large as the rest of the run's memory.
 std::size_t countCards(const fs::path& file) {
-  std::error_code error;
-  const auto size = fs::file_size(file, error);
-  if (error) return 0;
-  std::string bytes(size, '\0');
-  if (FILE* in = std::fopen(file.c_str(), "rb")) {
-    bytes.resize(std::fread(bytes.data(), 1, bytes.size(), in));
-    std::fclose(in);
-  }
   std::string pattern;
   for (char c : std::string_view("BEGIN:VCARD")) pattern += {'\0', c};
+  // Half the pattern's characters are NUL, as are half the file's bytes: a search that
+  // starts from the first byte would compare at every other position.
+  const std::boyer_moore_horspool_searcher searcher(pattern.begin(), pattern.end());
+  constexpr std::size_t kPiece = std::size_t{1} << 20;
+  std::string bytes;
   std::size_t count = 0;
-  for (auto at = bytes.find(pattern); at != std::string::npos; at = bytes.find(pattern, at + 1)) {
-    ++count;
+  FILE* in = std::fopen(file.c_str(), "rb");
+  if (!in) return 0;
+  for (;;) {
+    // The end of the previous piece stays, so that a pattern across two pieces is found.
+    const std::size_t kept = bytes.size();
+    bytes.resize(kept + kPiece);
+    bytes.resize(kept + std::fread(bytes.data() + kept, 1, kPiece, in));
+    const bool last = bytes.size() == kept;
+    auto from = bytes.begin();
+    for (auto at = std::search(from, bytes.end(), searcher); at != bytes.end();
+         at = std::search(at + 1, bytes.end(), searcher)) {
+      ++count;
+      from = at + 1;
+    }
+    if (last) break;
+    // Keep what could still begin a match (the bytes after the last match found).
+    const std::size_t tail =
+        std::min<std::size_t>(pattern.size() - 1, static_cast<std::size_t>(bytes.end() - from));
+    bytes.erase(0, bytes.size() - tail);
   }
+  std::fclose(in);
   return count;
 }
 

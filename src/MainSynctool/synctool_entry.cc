@@ -114,22 +114,25 @@ int synctoolMain(int argc, const char* const argv[]) {
   static Tool* tool = new Tool;
   auto report = std::make_shared<RunReport>();
   const std::filesystem::path storePath = tessel::Store::resolvePath();
+  SyncerMakers makers{.contacts = contacts::makeContactsSyncer,
+                      .calendars = calendars::makeCalendarsSyncer};
+  // The report is read only for the terminal's line: without one, nothing looks at the files.
+  const bool reporting = onTerminal();
+  if (reporting) makers = reportingMakers(std::move(makers), report);
   SyncServices services{*tool->devices,
                         platform::NotificationCenter::system(),
                         platform::UserDefaults::standard(),
                         tool->files,
                         platform::RunLoop::current(),
                         storePath,
-                        reportingMakers(SyncerMakers{.contacts = contacts::makeContactsSyncer,
-                                                     .calendars = calendars::makeCalendarsSyncer},
-                                        report),
+                        std::move(makers),
                         [](const std::string& volumePath) {
                           return device::deviceSupportsContactPictures(volumePath);
                         }};
   tool->manager = std::make_unique<ZTSyncManager>(std::move(*syncClientID), std::move(services));
   tool->manager->doSync();
   Log::debug("Done sync'ing Zeto");
-  if (onTerminal()) tellTerminal(outcomeLine(factsAfter(*tool->manager, storePath, *report)));
+  if (reporting) tellTerminal(outcomeLine(factsAfter(*tool->manager, storePath, *report)));
   return 0;
 }
 

@@ -176,11 +176,17 @@ platform::ImageService* ContactPhotoPreparation::imageService(Logging logging) {
   return service_.get();
 }
 
-void ContactPhotoPreparation::prefetch(std::span<const platform::Data* const> pictures) {
+void ContactPhotoPreparation::prefetch(std::span<const platform::Data* const> pictures,
+                                       std::span<const PictureOrigin> origins) {
   prefetched_.clear();
   std::vector<const platform::Data*> work;
-  for (const platform::Data* picture : pictures) {
-    if (picture && needsConversion(*picture)) work.push_back(picture);
+  std::vector<const PictureOrigin*> workOrigins;
+  for (std::size_t i = 0; i < pictures.size(); ++i) {
+    const platform::Data* picture = pictures[i];
+    if (picture && needsConversion(*picture)) {
+      work.push_back(picture);
+      workOrigins.push_back(i < origins.size() ? &origins[i] : nullptr);
+    }
   }
   if (work.empty()) return;
   std::vector<std::optional<PhotoConversion>> found(work.size());
@@ -190,7 +196,8 @@ void ContactPhotoPreparation::prefetch(std::span<const platform::Data* const> pi
       const platform::Data& picture = *work[i];
       PhotoKey key{};
       if (cache_) {
-        key = PhotoCache::keyFor(picture);
+        key = workOrigins[i] ? cache_->rememberedKeyFor(picture, *workOrigins[i])
+                             : PhotoCache::keyFor(picture);
         if ((found[i] = cache_->find(key))) continue;
       }
       platform::ImageService* service = imageService(Logging::Silent);

@@ -45,8 +45,11 @@ class ContactPhotoPreparation {
 
   // Converts, or finds in the cache, the pictures of cards about to be written, without
   // logging; the cards then take their photos from here. Each picture's bytes must stay alive
-  // and unchanged until its card is written. May be called once per batch of cards.
-  void prefetch(std::span<const platform::Data* const> pictures);
+  // and unchanged until its card is written. May be called once per batch of cards. With
+  // `origins` (one per picture), the cache finds the pictures by where they come from
+  // instead of reading all their bytes.
+  void prefetch(std::span<const platform::Data* const> pictures,
+                std::span<const PictureOrigin> origins = {});
   // Ends a run that wrote every card: forgets what prefetch() kept and removes the cache
   // entries that no picture used since the last end.
   void finishRun();

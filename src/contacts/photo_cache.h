@@ -3,13 +3,16 @@
 #include <array>
 #include <cstdint>
 #include <filesystem>
+#include <map>
 #include <memory>
 #include <mutex>
 #include <optional>
-#include <set>
 #include <span>
 #include <string>
+#include <string_view>
 
+#include "platform/atomic_file.h"
+#include "platform/file_reader.h"
 #include "platform/folder_handle.h"
 #include "platform/image_service.h"
 #include "platform/value.h"
@@ -47,13 +50,24 @@ bool isLasting(const PhotoConversion& conversion);
 
 using PhotoKey = std::array<std::uint8_t, 32>;
 
-// Converted pictures kept between runs, one file per picture in one folder, named by the
-// SHA-256 of the picture's bytes and of everything else the conversion depends on. Entries
-// are written to a temporary file and renamed, never through a symbolic link and never
-// outside the folder; an entry that cannot be read or does not hold what its name says is
-// treated as missing and written again. At the end of a run that used the cache, prune()
-// removes the entries the run did not use, then the oldest names until the size cap holds.
-// Every method may be called from several threads at once.
+// Where a picture comes from: one record of one store at one generation, which within that
+// store file always holds the same bytes.
+struct PictureOrigin {
+  std::string_view store;  // the store file's identity (platform::fileIdentity)
+  std::string_view record;
+  std::int64_t generation = 0;
+};
+
+// Converted pictures kept between runs in one pack file in one folder, each entry found by
+// the SHA-256 of the picture's bytes and of everything else the conversion depends on. The
+// pack is read a piece at a time, never through a symbolic link; an entry whose bytes do not
+// hold the key and length that the pack's index says is treated as missing and converted
+// again, and a pack whose index cannot be read counts as empty. What a run stores goes to
+// the next pack, a temporary file beside it; at the end of a run that used the cache, prune()
+// adds the entries the run found in the old pack, up to the size cap, and puts the next pack
+// in place in one rename: entries the run did not use are forgotten. The keys of the pictures
+// are kept too, by origin, in a file checked whole by its own digest. Every method may be
+// called from several threads at once.
 class PhotoCache {
  public:
   // The cache under $XDG_CACHE_HOME (or ~/.cache) in zetosynctool/photos, created when
@@ -65,6 +79,11 @@ class PhotoCache {
 
   // The key of `picture` for this build's conversion.
   static PhotoKey keyFor(std::span<const std::uint8_t> picture);
+
+  // The key of `picture` from `origin`: the one kept from an earlier run for the same store,
+  // record, generation and picture size, else keyFor(picture), then kept for the next run.
+  // It spares reading every picture's bytes on every push.
+  PhotoKey rememberedKeyFor(std::span<const std::uint8_t> picture, const PictureOrigin& origin);
 
   std::optional<PhotoConversion> find(const PhotoKey& key);
   // Keeps a lasting conversion; failures to write are ignored.
@@ -80,13 +99,44 @@ class PhotoCache {
   static constexpr std::uint32_t kConversionVersion = 1;
 
  private:
+  // Where an entry lies in a pack, and whether this run found it there.
+  struct Slot {
+    std::uint64_t offset = 0;
+    std::uint64_t length = 0;
+    bool used = false;
+  };
+
   PhotoCache(platform::FolderHandle folder, std::uint64_t sizeCap);
-  void touch(const std::string& name);
+  // Reads the index of the pack in place; a pack that cannot be read counts as empty.
+  void load();
+  using OriginDigest = std::array<std::uint8_t, 32>;
+  // The keys kept by the last run; one that cannot be read in full is no key at all.
+  void loadRemembered();
+  void saveRemembered();
+
+  // store() with the lock held.
+  void storeLocked(const PhotoKey& key, const PhotoConversion& conversion);
+  // Writes the index and puts the next pack in place, or removes the pack when nothing is
+  // kept.
+  void replacePack();
 
   platform::FolderHandle folder_;
   std::uint64_t sizeCap_;
   std::mutex mutex_;
-  std::set<std::string> used_;
+  // The pack in place when the cache was opened or last pruned, and its index.
+  std::optional<platform::FileReader> pack_;
+  std::map<PhotoKey, Slot> packed_;
+  // The next pack, made at the first store(), and what this run put in it.
+  std::optional<platform::AtomicFile> next_;
+  std::optional<platform::FileReader> nextReader_;
+  std::map<PhotoKey, Slot> stored_;
+  std::uint64_t nextSize_ = 0;
+  bool nextFailed_ = false;
+  // Picture keys by origin: those of the last run, and those this run used or made.
+  std::map<OriginDigest, PhotoKey> remembered_;
+  std::map<OriginDigest, PhotoKey> rememberedNow_;
+  // Whether the folder held entries of the cache's earlier form, one file per picture.
+  bool earlierEntries_ = false;
 };
 
 }  // namespace zt::contacts

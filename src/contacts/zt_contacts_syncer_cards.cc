@@ -1,10 +1,15 @@
 // The file image of the contacts: one card per selected contact of truth.
 #include <algorithm>
 #include <cstddef>
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <utility>
 #include <vector>
 
 #include "contacts/vcard_writer.h"
 #include "contacts/zt_contacts_syncer.h"
+#include "platform/identity.h"
 #include "platform/log.h"
 #include "platform/utf16.h"
 #include "sync/sync_status.h"
@@ -84,16 +89,25 @@ bool ZTContactsSyncer::disassembleData() {
     // The selected contacts are written a batch at a time, after their pictures have been
     // converted together; the photo setting is asked only once a card is to be written.
     std::vector<platform::Dictionary> batch;
+    // Where each contact of the batch was read: its identifier and generation.
+    std::vector<std::pair<std::string, std::int64_t>> read;
     std::vector<const platform::Data*> pictures;
+    std::vector<PictureOrigin> origins;
+    // Within the store file, a record's identifier and generation stand for its picture's
+    // bytes; without the file's identity, pictures are known by their bytes alone.
+    const std::optional<std::string> store =
+        platform::fileIdentity(_syncManager.services().storePath).valueOrNone();
     auto writeBatch = [&]() -> bool {
       if (batch.empty()) return true;
       if (_syncManager.shouldSyncContactImages()) {
         photosUsed = true;
         pictures.clear();
-        for (const platform::Dictionary& contact : batch) {
-          pictures.push_back(contact.dataAt(tessel::TesselAttribute_Contacts_Contact_Image));
+        origins.clear();
+        for (std::size_t i = 0; i < batch.size(); ++i) {
+          pictures.push_back(batch[i].dataAt(tessel::TesselAttribute_Contacts_Contact_Image));
+          if (store) origins.push_back({*store, read[i].first, read[i].second});
         }
-        ContactPhotoPreparation::shared().prefetch(pictures);
+        ContactPhotoPreparation::shared().prefetch(pictures, origins);
       }
       for (const platform::Dictionary& contact : batch) {
         card.clear();
@@ -112,6 +126,7 @@ bool ZTContactsSyncer::disassembleData() {
         }
       }
       batch.clear();
+      read.clear();
       return true;
     };
     for (std::size_t first = 0; first < identifiers.size(); first += kPhotoBatch) {
@@ -120,7 +135,10 @@ bool ZTContactsSyncer::disassembleData() {
           identifiers.begin() +
               static_cast<std::ptrdiff_t>(std::min(identifiers.size(), first + kPhotoBatch)));
       snapshot->forEachRecordWithIdentifiers(chunk, [&](tessel::Record& record) {
-        if (isSelected(record.record)) batch.push_back(std::move(record.record));
+        if (isSelected(record.record)) {
+          batch.push_back(std::move(record.record));
+          read.emplace_back(std::move(record.id), record.generation);
+        }
       });
       if (!writeBatch()) return false;
     }

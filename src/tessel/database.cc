@@ -89,6 +89,14 @@ CREATE TABLE record_links(
 CREATE INDEX record_links_by_source ON record_links(source);
 )sql",
        indexEveryRecord},
+      // The change pass reads identifier, generation and tombstone of the entities a session
+      // asks for; with them in the entity index it reads that index alone, never the rows of
+      // other entities or a row per record. It replaces the index by entity, whose queries it
+      // serves as well.
+      {R"sql(
+DROP INDEX records_by_entity;
+CREATE INDEX records_by_entity_id ON records(entity, id, generation, deleted);
+)sql"},
   };
   return steps;
 }

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <cstdint>
 #include <map>
 #include <string>
 
@@ -11,6 +12,9 @@ namespace tessel {
 struct Record {
   std::string id;
   zt::platform::Dictionary record;
+  // The generation of the record's last change, as a snapshot reads it (0 otherwise): within
+  // one store, the same identifier and generation always hold the same values.
+  std::int64_t generation = 0;
 };
 
 // Records by identifier, in identifier order.

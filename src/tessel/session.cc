@@ -296,11 +296,12 @@ void Session::prepareToPullChanges(const std::vector<std::string>& entityNames) 
   };
 
   // One pass over truth and the mirror side by side, both in identifier order, so that no
-  // record costs a search of the other side. The pass never names the data column: SQLite
-  // builds a result row whole, so naming it would read every record, pictures included. What
-  // may change, and every record a filter must judge, is then taken in the order truth
-  // changed; a record is read and decoded only when a filter judges it. Records the client
-  // holds that truth never had (or lost without a tombstone) come last, in identifier order.
+  // record costs a search of the other side. Truth is read from the entity index alone, and
+  // only for the entities asked for: the pass never reads a table row, whose data column
+  // would bring every record's bytes, pictures included. What may change, and every record a
+  // filter must judge, is then taken in the order truth changed; a record is read and decoded
+  // only when a filter judges it. Records the client holds that truth never had (or lost
+  // without a tombstone) come last, in identifier order.
   struct Candidate {
     std::int64_t generation;
     std::int64_t key;
@@ -317,40 +318,76 @@ void Session::prepareToPullChanges(const std::vector<std::string>& entityNames) 
   std::vector<Candidate> candidates;
   std::vector<Orphan> orphans;
   {
-    Statement truth(connection,
-                    "SELECT key, id, entity, generation, deleted FROM main.records ORDER BY id");
+    // Each entity's records in identifier order from the index, merged into one walk.
+    struct Stream {
+      std::unique_ptr<Statement> rows;
+      const EntityRule* rule;
+      std::string_view id;  // the current row's, valid until the next step
+    };
+    std::vector<Stream> streams;
+    for (const EntityRule& rule : rules) {
+      auto rows = std::make_unique<Statement>(
+          connection,
+          "SELECT key, id, generation, deleted FROM main.records WHERE entity = ?1 ORDER BY id");
+      rows->bind(1, rule.name);
+      if (rows->step()) {
+        const std::string_view id = rows->text(1);
+        streams.push_back({std::move(rows), &rule, id});
+      }
+    }
+    // The stream with the smallest identifier on top.
+    auto later = [](const Stream& a, const Stream& b) { return a.id > b.id; };
+    std::make_heap(streams.begin(), streams.end(), later);
+    // A record the client holds under an entity it asked for may have become one of another
+    // entity in truth: it is not gone, and nothing is offered for it.
+    Statement known(connection, "SELECT 1 FROM main.records WHERE id = ?1");
+    auto inTruth = [&](std::string_view id) {
+      StatementReset reset(known);
+      known.bind(1, id);
+      return known.step();
+    };
     Statement mirror(connection,
                      "SELECT record_id, generation, entity FROM main.mirror WHERE client_id = ?1 "
                      "ORDER BY record_id");
     mirror.bind(1, client);
     bool mirrorRow = mirror.step();
-    // Passes the mirror's records before `id` (none when at the end): truth has none of them.
+    // Passes the mirror's records before `id` (none when at the end): truth has none of them
+    // among the entities asked for.
     auto passMirrorBefore = [&](const std::string_view* id) {
       while (mirrorRow && (!id || mirror.text(0) < *id)) {
         if (const EntityRule* rule = findRule(mirror.text(2))) {
-          orphans.push_back({std::string(mirror.text(0)), rule, mirror.integer(1)});
+          if (!inTruth(mirror.text(0))) {
+            orphans.push_back({std::string(mirror.text(0)), rule, mirror.integer(1)});
+          }
         }
         mirrorRow = mirror.step();
       }
     };
-    while (truth.step()) {
-      const std::string_view id = truth.text(1);
+    while (!streams.empty()) {
+      std::pop_heap(streams.begin(), streams.end(), later);
+      Stream& stream = streams.back();
+      Statement& row = *stream.rows;
+      const std::string_view id = stream.id;
       passMirrorBefore(&id);
       std::optional<std::int64_t> held;
       if (mirrorRow && mirror.text(0) == id) {
         held = mirror.integer(1);
         mirrorRow = mirror.step();
       }
-      const EntityRule* rule = findRule(truth.text(2));
-      if (!rule) continue;
-      const std::int64_t generation = truth.integer(3);
-      const TruthState state = truth.integer(4) != 0 ? TruthState::Gone : TruthState::Live;
+      const EntityRule* rule = stream.rule;
+      const std::int64_t generation = row.integer(2);
+      const TruthState state = row.integer(3) != 0 ? TruthState::Gone : TruthState::Live;
       const bool judged = state == TruthState::Live && !rule->judges.empty();
-      if (!judged && decidePull(state, generation, held, FilterVerdict::Passes, rule->mode) ==
-                         PullAction::Nothing) {
-        continue;
+      if (judged || decidePull(state, generation, held, FilterVerdict::Passes, rule->mode) !=
+                        PullAction::Nothing) {
+        candidates.push_back({generation, row.integer(0), std::string(id), rule, state, held});
       }
-      candidates.push_back({generation, truth.integer(0), std::string(id), rule, state, held});
+      if (row.step()) {
+        stream.id = row.text(1);
+        std::push_heap(streams.begin(), streams.end(), later);
+      } else {
+        streams.pop_back();
+      }
     }
     passMirrorBefore(nullptr);
   }

@@ -101,7 +101,7 @@ void Snapshot::forEachRecordMatching(const zt::platform::Dictionary& criteria,
   for (const std::string& name : omitted) {
     (criteria.find(name) ? dropped : skipped).push_back(name);
   }
-  detail::Statement load(view_->connection(), "SELECT data FROM records WHERE key = ?");
+  detail::Statement load(view_->connection(), "SELECT data, generation FROM records WHERE key = ?");
   Record record;
   for (auto& [identifier, key] : candidates) {
     {
@@ -109,6 +109,7 @@ void Snapshot::forEachRecordMatching(const zt::platform::Dictionary& criteria,
       load.bind(1, key);
       if (!load.step()) continue;
       record.record = detail::decodeRecordWithout(load.blob(0), skipped);
+      record.generation = load.integer(1);
     }
     if (!matches(record.record, criteria)) continue;
     for (const std::string& name : dropped) record.record.erase(name);
@@ -135,7 +136,8 @@ void Snapshot::forEachRecordWithIdentifiers(const std::vector<std::string>& iden
       size = candidate;
       if (candidate >= left) break;
     }
-    std::string sql = "SELECT id, entity, data FROM records WHERE deleted = 0 AND id IN (?";
+    std::string sql =
+        "SELECT id, entity, data, generation FROM records WHERE deleted = 0 AND id IN (?";
     for (std::size_t i = 1; i < size; ++i) sql += ", ?";
     sql += ") ORDER BY id";
     detail::Statement& query = view_->connection().cached(sql);
@@ -150,6 +152,7 @@ void Snapshot::forEachRecordWithIdentifiers(const std::vector<std::string>& iden
       record.id = query.text(0);
       record.record = omitted.empty() ? detail::decodeRecord(query.blob(2))
                                       : detail::decodeRecordWithout(query.blob(2), omitted);
+      record.generation = query.integer(3);
       visit(record);
     }
   }

@@ -55,7 +55,8 @@ enum class Prefetch { No, Yes };
 using Threads = ContactPhotoPreparation::Threads;
 
 PhotoRun run(const std::vector<platform::Dictionary>& cards, std::unique_ptr<PhotoCache> cache,
-             Prefetch prefetch, Threads threads, bool serviceFails = false) {
+             Prefetch prefetch, Threads threads, bool serviceFails = false,
+             std::span<const PictureOrigin> origins = {}) {
   PhotoRun result;
   test_support::CapturedLog log;
   ContactPhotoPreparation preparation(
@@ -70,7 +71,7 @@ PhotoRun run(const std::vector<platform::Dictionary>& cards, std::unique_ptr<Pho
     std::vector<const Data*> pictures;
     for (const auto& card : cards)
       pictures.push_back(card.dataAt(tessel::TesselAttribute_Contacts_Contact_Image));
-    preparation.prefetch(pictures);
+    preparation.prefetch(pictures, origins);
   }
   for (const auto& card : cards) result.photos.push_back(preparation.photoForContact(card));
   preparation.finishRun();
@@ -87,6 +88,17 @@ std::vector<fs::path> entriesIn(const fs::path& folder) {
 class PhotoCacheTest : public ::testing::Test {
  protected:
   std::unique_ptr<PhotoCache> cache() { return PhotoCache::open(folder_.path() / "photos"); }
+  fs::path pack() const { return folder_.path() / "photos" / "pack"; }
+  // How many of the cards' pictures a fresh cache holds.
+  std::size_t kept(const std::vector<platform::Dictionary>& cards) {
+    std::unique_ptr<PhotoCache> fresh = cache();
+    std::size_t count = 0;
+    for (const auto& card : cards) {
+      const Data* image = card.dataAt(tessel::TesselAttribute_Contacts_Contact_Image);
+      count += fresh->find(PhotoCache::keyFor(*image)) ? 1 : 0;
+    }
+    return count;
+  }
 
   test_support::TemporaryFolder folder_;
   const std::vector<platform::Dictionary> cards_ = contacts();
@@ -103,8 +115,9 @@ TEST_F(PhotoCacheTest, EveryPathGivesTheBytesAndLinesOfAConversion) {
   const PhotoRun first = run(cards_, cache(), Prefetch::Yes, Threads::AllCores);
   EXPECT_EQ(first.photos, converted_.photos);
   EXPECT_EQ(first.log, converted_.log);
-  // Scaled, Png, Larger and Garbage.
-  EXPECT_EQ(entriesIn(folder_.path() / "photos").size(), 4u);
+  // Scaled, Png, Larger and Garbage, in one file.
+  EXPECT_EQ(kept(cards_), 4u);
+  EXPECT_EQ(entriesIn(folder_.path() / "photos"), std::vector<fs::path>{pack()});
 
   for (Prefetch prefetch : {Prefetch::No, Prefetch::Yes}) {
     const PhotoRun again = run(cards_, cache(), prefetch, Threads::AllCores);
@@ -114,35 +127,58 @@ TEST_F(PhotoCacheTest, EveryPathGivesTheBytesAndLinesOfAConversion) {
   }
 }
 
-TEST_F(PhotoCacheTest, DamagedEntriesAndLinksAreConvertedAgainAndReplaced) {
-  run(cards_, cache(), Prefetch::No, Threads::One);
-  std::vector<fs::path> entries = entriesIn(folder_.path() / "photos");
-  ASSERT_EQ(entries.size(), 4u);
-  // One entry cut short, one garbage, one a link to a file outside the folder.
-  fs::resize_file(entries[0], fs::file_size(entries[0]) / 2);
-  std::ofstream(entries[1], std::ios::trunc) << "ZTPHOTO1 not an entry";
-  const fs::path outside = folder_.path() / "outside";
-  fs::copy_file(entries[2], outside);
-  const auto outsideBytes = fs::file_size(outside);
-  fs::remove(entries[2]);
-  fs::create_symlink(outside, entries[2]);
+TEST_F(PhotoCacheTest, AKeyRememberedByOriginNeverGivesAnotherPicture) {
+  const std::vector<PictureOrigin> origins{{"store", "r0", 7}, {"store", "r1", 7}};
+  const std::vector<platform::Dictionary> two(cards_.begin(), cards_.begin() + 2);
+  const PhotoRun first = run(two, cache(), Prefetch::Yes, Threads::One, false, origins);
+  EXPECT_EQ(first.photos, std::vector(converted_.photos.begin(), converted_.photos.begin() + 2));
+  EXPECT_EQ(run(two, cache(), Prefetch::Yes, Threads::One, false, origins).servicesMade, 0);
+  // The same records and generations now hold each other's pictures (a store made again).
+  const std::vector<platform::Dictionary> swapped{cards_[1], cards_[0]};
+  const PhotoRun again = run(swapped, cache(), Prefetch::Yes, Threads::One, false, origins);
+  EXPECT_EQ(again.photos, (std::vector{converted_.photos[1], converted_.photos[0]}));
+}
 
+TEST_F(PhotoCacheTest, DamagedPacksAndLinksAreConvertedAgainAndReplaced) {
+  run(cards_, cache(), Prefetch::No, Threads::One);
+  // One entry's key damaged: that picture alone is converted again.
+  {
+    std::fstream file(pack(), std::ios::in | std::ios::out | std::ios::binary);
+    file.seekp(8);
+    file.put('\xA5');
+  }
+  const PhotoRun damaged = run(cards_, cache(), Prefetch::Yes, Threads::AllCores);
+  EXPECT_EQ(damaged.photos, converted_.photos);
+  EXPECT_EQ(damaged.log, converted_.log);
+  EXPECT_EQ(kept(cards_), 4u);
+
+  // A pack cut short, and one that is a link to a file outside the folder, count as empty.
+  fs::resize_file(pack(), fs::file_size(pack()) - 1);
+  EXPECT_EQ(kept(cards_), 0u);
+  const fs::path outside = folder_.path() / "outside";
+  fs::copy_file(pack(), outside);
+  const auto outsideBytes = fs::file_size(outside);
+  fs::remove(pack());
+  fs::create_symlink(outside, pack());
   const PhotoRun again = run(cards_, cache(), Prefetch::Yes, Threads::AllCores);
   EXPECT_EQ(again.photos, converted_.photos);
   EXPECT_EQ(again.log, converted_.log);
   EXPECT_EQ(again.servicesMade, 1);
-  for (const fs::path& entry : entriesIn(folder_.path() / "photos"))
-    EXPECT_TRUE(fs::is_regular_file(fs::symlink_status(entry))) << entry;
+  EXPECT_TRUE(fs::is_regular_file(fs::symlink_status(pack())));
   EXPECT_EQ(fs::file_size(outside), outsideBytes);
   EXPECT_EQ(run(cards_, cache(), Prefetch::No, Threads::One).servicesMade, 0);
 }
 
 TEST_F(PhotoCacheTest, ARunKeepsOnlyThePicturesItUsedWithinTheCap) {
   run(cards_, cache(), Prefetch::No, Threads::One);
-  std::ofstream(folder_.path() / "photos" / ".0123.tmp99.1") << "left by a killed run";
+  // Left by a killed run, and an entry of the cache's earlier form, one file per picture.
+  std::ofstream(folder_.path() / "photos" / ".pack.tmp99aZ") << "left by a killed run";
+  std::ofstream(folder_.path() / "photos" / std::string(64, 'a')) << "ZTPHOTO1";
   const std::vector<platform::Dictionary> fewer(cards_.begin(), cards_.begin() + 2);
   run(fewer, cache(), Prefetch::Yes, Threads::One);
-  EXPECT_EQ(entriesIn(folder_.path() / "photos").size(), 2u);
+  EXPECT_EQ(kept(fewer), 2u);
+  EXPECT_EQ(kept(cards_), 2u);
+  EXPECT_EQ(entriesIn(folder_.path() / "photos"), std::vector<fs::path>{pack()});
 
   run(fewer, PhotoCache::open(folder_.path() / "photos", 1), Prefetch::No, Threads::One);
   EXPECT_TRUE(entriesIn(folder_.path() / "photos").empty());

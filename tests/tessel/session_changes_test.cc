@@ -48,6 +48,10 @@ TEST_F(SessionChanges, AddsModifiesAndDeletesFollowTruthInTheOrderItChanged) {
   EXPECT_EQ(syncAll(), (std::vector<std::string>{"A:c2", "A:c1", "A:g1"}));
   EXPECT_EQ(client_->mirrorSize(), 3u);
   EXPECT_TRUE(syncAll().empty());
+  // A held record that became one of an entity the client does not take is not gone.
+  store_->putRecords({{"g1", Dictionary{{std::string(TesselRecordEntityNameKey),
+                                         TesselEntity_Calendars_Organizer}}}});
+  EXPECT_TRUE(syncAll().empty());
 
   store_->putRecords({contact("c1", "Anne")});
   store_->deleteRecords({"c2"});

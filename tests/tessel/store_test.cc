@@ -218,10 +218,14 @@ TEST_F(StoreRelationships, AStoreFromBeforeTheIndexIsIndexedWhenOpened) {
   store_->putRecords(
       {entity("o1", TesselEntity_Calendars_Organizer), calendar("k1"), event("e1", "o1", {})});
   store_.reset();
-  execute(storePath_, "DROP TABLE record_links; UPDATE schema_version SET version = 1");
+  // The first schema: no link index, and the entity index without identifiers.
+  execute(storePath_,
+          "DROP TABLE record_links; DROP INDEX records_by_entity_id; "
+          "CREATE INDEX records_by_entity ON records(entity, deleted); "
+          "UPDATE schema_version SET version = 1");
 
   store_ = Store::open(storePath_, StoreOpening::MustExist);
-  EXPECT_EQ(store_->schemaVersion(), 2);
+  EXPECT_EQ(store_->schemaVersion(), 3);
   store_->deleteRecords({"o1"});
   EXPECT_FALSE(store_->record("e1")->contains(TesselRelationship_Calendars_Event_Organizer));
 }
