@@ -3,6 +3,7 @@
 #include <cstring>
 #include <string_view>
 
+#include "platform/sha256.h"
 #include "platform/user_cache.h"
 
 namespace zt::calendars {
@@ -12,20 +13,6 @@ namespace {
 // An entry: the magic, the key, the text's length (8 bytes, little-endian), then the text.
 constexpr std::string_view kMagic = "ZTCALTX1";
 constexpr std::size_t kHeaderSize = kMagic.size() + 32 + 8;
-
-std::string nameOf(const CalendarTextCache::Key& key) {
-  static constexpr char kHex[] = "0123456789abcdef";
-  std::string name;
-  for (std::uint8_t byte : key) {
-    name += kHex[byte >> 4];
-    name += kHex[byte & 0xF];
-  }
-  return name;
-}
-
-bool isEntryName(std::string_view name) {
-  return name.size() == 64 && name.find_first_not_of("0123456789abcdef") == std::string::npos;
-}
 
 }  // namespace
 
@@ -38,7 +25,7 @@ std::unique_ptr<CalendarTextCache> CalendarTextCache::openUserCache() {
 CalendarTextCache::CalendarTextCache(platform::FolderHandle folder) : folder_(std::move(folder)) {}
 
 std::optional<std::vector<std::uint8_t>> CalendarTextCache::find(const Key& key) {
-  const std::string name = nameOf(key);
+  const std::string name = platform::hexOf(key);
   std::optional<std::vector<std::uint8_t>> entry =
       folder_.readFile(name, kHeaderSize + kSizeCap).valueOrNone();
   if (!entry || entry->size() < kHeaderSize ||
@@ -66,7 +53,7 @@ void CalendarTextCache::store(const Key& key, std::span<const std::uint8_t> text
   entry.insert(entry.end(), key.begin(), key.end());
   for (int i = 0; i < 8; ++i) entry.push_back(static_cast<std::uint8_t>(text.size() >> (8 * i)));
   entry.insert(entry.end(), text.begin(), text.end());
-  const std::string name = nameOf(key);
+  const std::string name = platform::hexOf(key);
   // No fsync: an entry cut short by a crash fails its length check and is written again.
   if (folder_.atomicWrite(name, entry, platform::Durability::Unsynced)) used_.insert(name);
 }
@@ -77,7 +64,7 @@ void CalendarTextCache::prune() {
     std::uint64_t total = 0;
     for (const std::string& name : *listed) {
       // Removal is best effort: what stays is tried again at the next run.
-      if (!isEntryName(name)) {
+      if (!platform::isHexDigest(name)) {
         if (name.starts_with('.') && name.find(".tmp") != std::string::npos)
           (void)folder_.remove(name);
         continue;

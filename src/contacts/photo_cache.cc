@@ -44,21 +44,6 @@ std::uint64_t getNumber(const std::uint8_t*& at, int bytes) {
   return value;
 }
 
-// The name of an entry of the cache's earlier form, one file per picture.
-std::string nameOf(const PhotoKey& key) {
-  static constexpr char kHex[] = "0123456789abcdef";
-  std::string name;
-  for (std::uint8_t byte : key) {
-    name += kHex[byte >> 4];
-    name += kHex[byte & 0xF];
-  }
-  return name;
-}
-
-bool isEntryName(std::string_view name) {
-  return name.size() == 64 && name.find_first_not_of("0123456789abcdef") == std::string::npos;
-}
-
 platform::Data encode(const PhotoKey& key, const PhotoConversion& conversion) {
   platform::Data out;
   out.reserve(kHeaderSize + conversion.reduced.size());
@@ -221,7 +206,9 @@ void PhotoCache::load() {
   packed_.clear();
   earlierEntries_ = false;
   if (platform::Result<std::vector<std::string>> listed = folder_.entries()) {
-    earlierEntries_ = std::any_of(listed->begin(), listed->end(), isEntryName);
+    earlierEntries_ = std::any_of(listed->begin(), listed->end(), [](const std::string& name) {
+      return platform::isHexDigest(name);
+    });
   }
   platform::Result<platform::FileReader> opened =
       platform::FileReader::open(folder_, std::string(kPackName));
@@ -289,7 +276,7 @@ std::optional<PhotoConversion> PhotoCache::find(const PhotoKey& key) {
     // A picture kept by the cache's earlier form, one file per picture, goes into the next
     // pack instead of being converted again.
     std::optional<platform::Data> earlier =
-        folder_.readFile(nameOf(key), kLargestEntry).valueOrNone();
+        folder_.readFile(platform::hexOf(key), kLargestEntry).valueOrNone();
     std::optional<PhotoConversion> conversion;
     if (earlier) conversion = decode(key, *earlier);
     if (conversion) storeLocked(key, *conversion);
@@ -404,7 +391,8 @@ void PhotoCache::prune() {
       // Entries of the cache's earlier form and temporaries left by killed runs go: no other
       // run writes this folder meanwhile, or it only costs that run its conversions. Removal
       // is best effort: what stays is tried again at the next run.
-      if (isEntryName(name) || (name.starts_with('.') && name.find(".tmp") != std::string::npos)) {
+      if (platform::isHexDigest(name) ||
+          (name.starts_with('.') && name.find(".tmp") != std::string::npos)) {
         (void)folder_.remove(name);
       }
     }

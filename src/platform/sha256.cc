@@ -2,6 +2,8 @@
 
 #include <openssl/evp.h>
 
+#include <tuple>
+
 namespace zt::platform {
 
 struct Sha256::State {
@@ -32,6 +34,22 @@ Sha256::Digest Sha256::finish() {
   if (state_->usable) EVP_DigestFinal_ex(state_->context, digest.data(), &length);
   state_->usable = false;
   return digest;
+}
+
+std::string hexOf(const Sha256::Digest& digest) {
+  static constexpr char kHex[] = "0123456789abcdef";
+  std::string text;
+  text.reserve(2 * digest.size());
+  for (std::uint8_t byte : digest) {
+    text += kHex[byte >> 4];
+    text += kHex[byte & 0xF];
+  }
+  return text;
+}
+
+bool isHexDigest(std::string_view name) {
+  return name.size() == 2 * std::tuple_size_v<Sha256::Digest> &&
+         name.find_first_not_of("0123456789abcdef") == std::string_view::npos;
 }
 
 }  // namespace zt::platform

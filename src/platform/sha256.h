@@ -4,6 +4,7 @@
 #include <cstdint>
 #include <memory>
 #include <span>
+#include <string>
 #include <string_view>
 
 namespace zt::platform {
@@ -28,5 +29,10 @@ class Sha256 {
   struct State;
   std::unique_ptr<State> state_;
 };
+
+// A digest as 64 lower-case hexadecimal digits, as the caches name their entries.
+std::string hexOf(const Sha256::Digest& digest);
+// Whether `name` is such a text.
+bool isHexDigest(std::string_view name);
 
 }  // namespace zt::platform
