@@ -168,11 +168,10 @@ class CurlHttpClient : public HttpClient {
     return {std::move(response), Failure::None};
   }
 
-  // The server speaks no TLS there. A certificate that fails verification is not among these:
-  // falling back to http would hand whoever forged it the collection anyway.
-  static bool connectionFailure(CURLcode code) {
-    return code == CURLE_COULDNT_CONNECT || code == CURLE_SSL_CONNECT_ERROR;
-  }
+  // Nothing listens for TLS there. A handshake that fails is not among these, nor is a
+  // certificate that fails verification: whoever stands on the path can cause either, and a
+  // fallback to http would hand them the collection.
+  static bool connectionFailure(CURLcode code) { return code == CURLE_COULDNT_CONNECT; }
 
   std::string describe(CURLcode code, const char* detail, const Transfer& transfer) const {
     const std::string limit = std::to_string(limits_.maxBytes >> 20) + " MiB";

@@ -45,6 +45,14 @@ Result<Source> fromJson(const nlohmann::json& json) {
   Source source;
   source.identifier = json["id"].get<std::string>();
   source.location = json["location"].get<std::string>();
+  // The identifier names the source's state file; `add` only ever makes digits.
+  if (source.identifier.empty() ||
+      source.identifier.find_first_not_of("0123456789") != std::string::npos)
+    return Error{"a source whose id \"" + source.identifier + "\" is not a number"};
+  // A password in the address would be shown in every message about the source.
+  if (Source::isAddress(source.location) &&
+      serverOfAddress(source.location).find('@') != std::string::npos)
+    return Error{"a source whose address carries a user name: use a credentials file"};
   auto collection = collectionNamed(json["collection"].get<std::string>());
   if (!collection) return Error{collection.error()};
   source.collection = *collection;

@@ -147,6 +147,17 @@ std::string refreshAddressBook(Store& store, const Source& source,
       continue;
     for (std::string& id : states.load(other).records) elsewhere.insert(std::move(id));
   }
+  // Before the store changes, the state remembers every contact this source may add now, with
+  // the earlier validators: should a later step fail, the next refresh downloads again and
+  // still knows to remove what left the source.
+  SourceState provisional = states.load(source);
+  provisional.records.insert(provisional.records.end(), produced.begin(), produced.end());
+  std::sort(provisional.records.begin(), provisional.records.end());
+  provisional.records.erase(std::unique(provisional.records.begin(), provisional.records.end()),
+                            provisional.records.end());
+  if (auto saved = states.save(source, provisional); !saved)
+    throw importers::ImportError(source.location, std::nullopt,
+                                 "its state cannot be kept: " + saved.error());
   const importers::VCardImportSummary summary = std::move(import).writeTo(store, SyncDeletes::Off);
   const std::size_t deleted =
       store.deleteRecords(staleRecords(store, state.records, produced, elsewhere));
