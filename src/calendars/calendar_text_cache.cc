@@ -54,8 +54,9 @@ void CalendarTextCache::store(const Key& key, std::span<const std::uint8_t> text
   for (int i = 0; i < 8; ++i) entry.push_back(static_cast<std::uint8_t>(text.size() >> (8 * i)));
   entry.insert(entry.end(), text.begin(), text.end());
   const std::string name = platform::hexOf(key);
-  // No fsync: an entry cut short by a crash fails its length check and is written again.
-  if (folder_.atomicWrite(name, entry, platform::Durability::Unsynced)) used_.insert(name);
+  // Synced before it is named: after a crash a file system may keep the length of an unsynced
+  // file but not its bytes, and the length check would then pass over zeros.
+  if (folder_.atomicWrite(name, entry, platform::Durability::Synced)) used_.insert(name);
 }
 
 void CalendarTextCache::prune() {

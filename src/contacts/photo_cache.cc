@@ -368,8 +368,9 @@ void PhotoCache::replacePack() {
     putNumber(tail, nextSize_, 8);
     putNumber(tail, kept.size(), 8);
     for (char c : kPackMagic) tail.push_back(static_cast<std::uint8_t>(c));
-    // No fsync: a pack cut short by a crash has no readable index and counts as empty.
-    if (next_->write(tail)) (void)next_->commit(platform::Durability::Unsynced);
+    // Synced before it is named: after a crash a file system may keep the length of an unsynced
+    // file but not its bytes, and an index over zeros would hand out zeros as pictures.
+    if (next_->write(tail)) (void)next_->commit(platform::Durability::Synced);
   } else if (!nextFailed_) {
     (void)folder_.remove(std::string(kPackName));
   }
