@@ -68,7 +68,10 @@ std::vector<zt::platform::Notification> NotificationFile::readNew() {
   std::error_code error;
   const std::uintmax_t size = std::filesystem::file_size(path_, error);
   if (error || size == offset_) return notes;
-  if (size < offset_) offset_ = 0;  // emptied: read it from its start
+  if (size < offset_) {  // emptied: read it from its start, without the old partial line
+    offset_ = 0;
+    pending_.clear();
+  }
   std::ifstream in(path_, std::ios::binary);
   in.seekg(static_cast<std::streamoff>(offset_));
   std::string chunk(static_cast<std::size_t>(size - offset_), '\0');
