@@ -12,6 +12,7 @@
 #include <vector>
 
 #include "importers/import_warnings.h"
+#include "importers/malformed_report.h"
 #include "importers/stable_hash.h"
 #include "support/files.h"
 #include "support/scoped_environment.h"
@@ -156,33 +157,15 @@ TEST(ICalImportReading, NothingIsLostInSilence) {
 // reason; with OnFault::Skip, what is kept and each warning. Compared with
 // golden/ical/malformed.txt.
 TEST(ICalImportReading, MalformedInputCostsWhatCannotBeReadOrWithRefuseEverything) {
-  std::string faults;
-  const auto line = [](std::optional<std::size_t> number) {
-    return "line " + std::to_string(number.value_or(0)) + ": ";
-  };
-  for (const std::string& name : zt::test_support::namesIn(kData / "malformed")) {
-    const std::vector<fs::path> paths = {kData / "outlook.ics", kData / "malformed" / name};
-    try {
-      readICalendarPaths(paths);
-      faults += name + ": accepted\n";
-    } catch (const ImportError& e) {
-      EXPECT_EQ(e.source(), (kData / "malformed" / name).string());
-      faults += name + ": " + line(e.line()) + e.reason() + "\n";
-    }
-    ImportWarnings warnings(OnFault::Skip);
-    try {
-      const std::vector<ICalCalendar> read =
-          readICalendarPaths(parseICalendarPaths(paths, warnings), {}, {}, warnings);
-      faults += "  kept " + std::to_string(read.back().eventCount) + " events, " +
-                std::to_string(read.back().taskCount) + " tasks\n";
-    } catch (const ImportError& e) {
-      faults += "  refused: " + line(e.line()) + e.reason() + "\n";
-    }
-    for (const ImportWarning& warning : warnings.all()) {
-      EXPECT_EQ(warning.source, (kData / "malformed" / name).string());
-      faults += "  warning: " + line(warning.line) + warning.message + "\n";
-    }
-  }
+  const std::string faults = malformedReport(
+      kData / "malformed", kData / "outlook.ics",
+      [](const ImportPaths& paths) { readICalendarPaths(paths); },
+      [](const ImportPaths& paths, ImportWarnings& warnings) {
+        const std::vector<ICalCalendar> read =
+            readICalendarPaths(parseICalendarPaths(paths, warnings), {}, {}, warnings);
+        return std::to_string(read.back().eventCount) + " events, " +
+               std::to_string(read.back().taskCount) + " tasks";
+      });
   EXPECT_TRUE(zt::test_support::matchesGoldenFile(
       fs::path(ZT_TEST_DATA_DIR) / "golden" / "ical" / "malformed.txt", faults));
 }

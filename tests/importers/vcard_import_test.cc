@@ -12,6 +12,7 @@
 #include <vector>
 
 #include "importers/import_error.h"
+#include "importers/malformed_report.h"
 #include "support/files.h"
 #include "tessel/record_json.h"
 #include "tessel/schema.h"
@@ -95,33 +96,17 @@ TEST(VCardImportContent, IdentifiersWithoutUidAreStable) {
 // line and reason; with OnFault::Skip, what is kept and each warning. Compared with
 // golden/vcard/malformed.txt.
 TEST(VCardImportMalformed, EachFaultCostsWhatCannotBeReadOrWithRefuseEverything) {
-  std::string faults;
-  const auto line = [](std::optional<std::size_t> number) {
-    return "line " + std::to_string(number.value_or(0)) + ": ";
-  };
-  for (const std::string& name : zt::test_support::namesIn(kData / "malformed")) {
-    const std::vector<fs::path> paths = {kData / "vdir", kData / "malformed" / name};
-    VCardImport import;
-    try {
-      import.addPaths(paths);
-      faults += name + ": accepted\n";
-    } catch (const ImportError& e) {
-      EXPECT_EQ(e.source(), (kData / "malformed" / name).string());
-      faults += name + ": " + line(e.line()) + e.reason() + "\n";
-    }
-    ImportWarnings warnings(OnFault::Skip);
-    VCardImport lenient(warnings);
-    try {
-      lenient.addPaths(paths);
-      faults += "  kept " + std::to_string(lenient.contactCount()) + " contacts\n";
-    } catch (const ImportError& e) {
-      faults += "  refused: " + line(e.line()) + e.reason() + "\n";
-    }
-    for (const ImportWarning& warning : warnings.all()) {
-      EXPECT_EQ(warning.source, (kData / "malformed" / name).string());
-      faults += "  warning: " + line(warning.line) + warning.message + "\n";
-    }
-  }
+  const std::string faults = malformedReport(
+      kData / "malformed", kData / "vdir",
+      [](const ImportPaths& paths) {
+        VCardImport import;
+        import.addPaths(paths);
+      },
+      [](const ImportPaths& paths, ImportWarnings& warnings) {
+        VCardImport lenient(warnings);
+        lenient.addPaths(paths);
+        return std::to_string(lenient.contactCount()) + " contacts";
+      });
   EXPECT_TRUE(zt::test_support::matchesGoldenFile(
       fs::path(ZT_TEST_DATA_DIR) / "golden" / "vcard" / "malformed.txt", faults));
   VCardImport import;
